@@ -1,0 +1,98 @@
+/* The editor record and the functions the editor's modules call in each
+ * other. Everything here is internal to the library. */
+#ifndef EDITOR_SVC_PRIVATE_H
+#define EDITOR_SVC_PRIVATE_H
+
+#include <Elementary.h>
+#include <efl_assist.h>
+
+#include "editor-svc.h"
+#include "ie-config.h"
+#include "ie-debug.h"
+
+#define IE_EDJ_FILE RES_DIR "edje/image-editor.edj"
+#define IE_TEXT_DOMAIN "image-editor"
+#define IE_HOST_TEXT_DOMAIN "marlune"
+
+/* One editor: the host holds it as an opaque handle. Allocated zero-filled
+ * by IE_INIT, freed by IE_destroy. Fields in their documented order. */
+struct _Viewhandle {
+	Evas_Object *layout;
+	Evas_Object *transparent_layout;
+	Evas_Object *funcbar;
+	Evas_Object *cancel_btn;
+	Evas_Object *done_btn;
+	Evas_Object *toolbar;
+	Eina_List *effect_items;
+	Evas_Object *naviframe;
+	Evas_Object *main_image;
+	Evas_Object *scroller;
+	Elm_Object_Item *navi_item;
+	int32_t width;
+	int32_t height;
+	int32_t thumb_width;
+	int32_t thumb_height;
+	int32_t image_width;
+	int32_t image_height;
+	unsigned char *thumb_buf;
+	unsigned char *orig_buf;
+	unsigned char *effect_buf;
+	Elm_Gengrid_Item_Class *effect_itc;
+	Evas_Object *effect_layout;
+	Evas_Object *effect_grid;
+	Elm_Gengrid_Item_Class *toolbar_itc;
+	Evas_Object *selectbox;
+	Evas_Object *crop_layout;
+	Eina_Bool effect_applied;
+	Eina_Bool slider_hidden;
+	Eina_Bool rotated;
+	Eina_Bool edited;
+	Evas_Object *popup;
+	Evas_Object *slider_layout;
+	int32_t touch_x;
+	int32_t touch_last_x;
+	int32_t touch_y;
+	int32_t effect_index;
+	int32_t slider_touching;
+	int32_t slider_value;
+	int32_t slider_start_value;
+	Ea_Theme_Color_Table *color_table;
+	int32_t win_rotation;
+	Ea_Theme_Font_Table *font_table;
+	void *log_handle;
+};
+
+/* editor-svc.cpp */
+Viewhandle *IE_INIT(void);
+Evas_Object *create_layout(Evas_Object *parent, const char *group);
+
+/* Window rotation in degrees of the window the editor lives in; 0 when the
+ * host registered none. */
+int ie_window_rotation_get(void);
+/* 0 and 180 degrees are portrait, any other rotation landscape. */
+static inline Eina_Bool ie_rotation_is_portrait(int rotation)
+{
+	return rotation == 0 || rotation == 180;
+}
+
+/* ie-bars.cpp */
+void create_funcbar(Viewhandle *vh);
+void create_gengrid_toolbar(Viewhandle *vh);
+void _on_layout_resized(void *data, Evas *e, Evas_Object *obj, void *event_info);
+
+/* ie-menu.cpp */
+void _on_menu_cancel(void *data, Evas_Object *obj, void *event_info);
+void _on_menu_done(void *data, Evas_Object *obj, void *event_info);
+void _popup_close(Viewhandle *vh);
+
+/* ie-crop-view.cpp: the selection rectangle in canvas coordinates, while
+ * the crop view shows one. */
+Eina_Bool ie_crop_region_get(Viewhandle *vh, Evas_Coord *x, Evas_Coord *y, Evas_Coord *w, Evas_Coord *h);
+
+/* ie-log-manager.cpp */
+void *log_manager_create(void);
+void _ie_log_manager_create(Viewhandle *vh);
+void _ie_log_manager_insert(Viewhandle *vh, const char *feature);
+void _ie_log_manager_destroy(Viewhandle *vh);
+
+#endif

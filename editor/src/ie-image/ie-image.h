@@ -1,0 +1,35 @@
+/* The main image object ("ie-mainimg"): shows the picture fitted to its
+ * area, zooms it with a pinch or a double tap, pans it, and gives the views
+ * access to its pixels (BGRA, stride = width * 4). */
+#ifndef IE_IMAGE_H
+#define IE_IMAGE_H
+
+#include <Evas.h>
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+enum {
+	IE_IMAGE_MODE_PASSIVE = 0,
+	IE_IMAGE_MODE_NORMAL = 1,
+	IE_IMAGE_MODE_CROP = 2,
+	IE_IMAGE_MODE_ACTIVE = 3
+};
+
+Evas_Object *ie_image_add(Evas_Object *parent);
+Eina_Bool ie_image_file_load(Evas_Object *obj, const char *path, int width, int height);
+void *ie_image_data_get(Evas_Object *obj);
+Evas_Object *ie_image_object_get(Evas_Object *obj);
+void ie_image_geometry_get(Evas_Object *obj, Evas_Coord *x, Evas_Coord *y, Evas_Coord *w, Evas_Coord *h);
+void ie_image_zoom_enabled_set(Evas_Object *obj, Eina_Bool enable);
+void ie_image_double_tap_enabled_set(Eina_Bool enable, Evas_Object *obj);
+void ie_image_mode_set(Evas_Object *obj, int mode);
+void ie_image_refit(Evas_Object *obj);
+void ie_image_size_update(Evas_Object *obj);
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif

@@ -1,0 +1,119 @@
+/* main() of the test binaries: a headless EFL environment (buffer engine,
+ * synchronous rendering, a private home), Elementary initialised once, and
+ * every EFL error line recorded for the fixture to judge. */
+#include <Elementary.h>
+#include <gtest/gtest.h>
+
+#include <cstdlib>
+#include <filesystem>
+#include <mutex>
+#include <unistd.h>
+
+#include "ie-config.h"
+#include "ie-test-internal.h"
+
+namespace iet {
+
+namespace {
+
+std::mutex errors_lock;
+std::vector<std::string> errors;
+std::vector<std::string> allowed;
+
+void record_eina_log(const Eina_Log_Domain *d, Eina_Log_Level level, const char *file, const char *fnc,
+		     int line, const char *fmt, void *data, va_list args)
+{
+	if (level <= EINA_LOG_LEVEL_ERR) {
+		va_list copy;
+		va_copy(copy, args);
+		char text[1024];
+		vsnprintf(text, sizeof(text), fmt, copy);
+		va_end(copy);
+		std::lock_guard<std::mutex> hold(errors_lock);
+		errors.push_back(std::string(d && d->name ? d->name : "?") + ": " + fnc + ": " + text);
+	}
+	eina_log_print_cb_stderr(d, level, file, fnc, line, fmt, data, args);
+}
+
+std::string private_home;
+
+void prepare_environment()
+{
+	std::string pattern = (std::filesystem::temp_directory_path() / "ie-test-home-XXXXXX").string();
+	if (mkdtemp(pattern.data()))
+		private_home = pattern;
+	for (const char *sub : {"cache", "config", "runtime"})
+		std::filesystem::create_directories(private_home + "/" + sub);
+	std::filesystem::permissions(private_home + "/runtime", std::filesystem::perms::owner_all);
+	setenv("HOME", private_home.c_str(), 1);
+	setenv("XDG_CACHE_HOME", (private_home + "/cache").c_str(), 1);
+	setenv("XDG_CONFIG_HOME", (private_home + "/config").c_str(), 1);
+	setenv("XDG_RUNTIME_DIR", (private_home + "/runtime").c_str(), 1);
+	setenv("ELM_ENGINE", "buffer", 1);
+	setenv("ECORE_NO_SYSTEM_MODULES", "1", 1);
+	setenv("ECORE_EVAS_FORCE_SYNC_RENDER", "1", 1);
+	setenv("ECORE_EVAS_RENDER_NOSYNC", "1", 1);
+	setenv("EINA_LOG_BACKTRACE", "-1", 1);
+	setenv("EINA_LOG_LEVELS", "ecore_con:0", 1);
+	setenv("ELM_PROFILE_NOSAVE", "1", 1);
+	setenv("DLOG_LEVEL", "S", 0);
+	// The platform stand-ins keep their data in the scratch home.
+	setenv("MEDIA_CONTENT_DB", (private_home + "/media.db").c_str(), 0);
+	setenv("VANTRIC_LOG_DB", (private_home + "/vantric-log.db").c_str(), 0);
+	setenv("STORAGE_INTERNAL_ROOT", private_home.c_str(), 0);
+	setenv("APP_CONTROL_LAUNCHER_DIR", (private_home + "/launchers").c_str(), 0);
+}
+
+class ElementaryEnvironment : public ::testing::Environment {
+public:
+	ElementaryEnvironment(int argc, char **argv) : argc_(argc), argv_(argv) {}
+	void SetUp() override
+	{
+		elm_init(argc_, argv_);
+		const char *theme = RES_DIR "edje/image-editor.edj";
+		if (access(theme, R_OK) == 0)
+			elm_theme_extension_add(nullptr, theme);
+	}
+	void TearDown() override
+	{
+		elm_shutdown();
+		if (!private_home.empty())
+			std::filesystem::remove_all(private_home);
+	}
+
+private:
+	int argc_;
+	char **argv_;
+};
+
+} // namespace
+
+std::vector<std::string> &efl_errors()
+{
+	return errors;
+}
+
+std::vector<std::string> &allowed_efl_errors()
+{
+	return allowed;
+}
+
+void efl_errors_clear()
+{
+	std::lock_guard<std::mutex> hold(errors_lock);
+	errors.clear();
+}
+
+} // namespace iet
+
+int main(int argc, char **argv)
+{
+	iet::prepare_environment();
+	eina_init();
+	eina_log_print_cb_set(iet::record_eina_log, nullptr);
+	::testing::InitGoogleTest(&argc, argv);
+	::testing::AddGlobalTestEnvironment(new iet::ElementaryEnvironment(argc, argv));
+	int result = RUN_ALL_TESTS();
+	eina_shutdown();
+	return result;
+}
