@@ -35,20 +35,26 @@ void record_eina_log(const Eina_Log_Domain *d, Eina_Log_Level level, const char 
 	eina_log_print_cb_stderr(d, level, file, fnc, line, fmt, data, args);
 }
 
-std::string private_home;
+std::string data_dir;
 
+/* EFL's home (efreet's cache, Elementary's config) is shared by the test
+ * processes of a build when IE_TEST_HOME names it: efreetd then starts once
+ * instead of once per test. Each process keeps its own data directory for
+ * the platform services. */
 void prepare_environment()
 {
-	std::string pattern = (std::filesystem::temp_directory_path() / "ie-test-home-XXXXXX").string();
-	if (mkdtemp(pattern.data()))
-		private_home = pattern;
+	std::string scratch = (std::filesystem::temp_directory_path() / "ie-test-XXXXXX").string();
+	if (mkdtemp(scratch.data()))
+		data_dir = scratch;
+	const char *shared_home = getenv("IE_TEST_HOME");
+	std::string home = shared_home ? shared_home : data_dir + "/home";
 	for (const char *sub : {"cache", "config", "runtime"})
-		std::filesystem::create_directories(private_home + "/" + sub);
-	std::filesystem::permissions(private_home + "/runtime", std::filesystem::perms::owner_all);
-	setenv("HOME", private_home.c_str(), 1);
-	setenv("XDG_CACHE_HOME", (private_home + "/cache").c_str(), 1);
-	setenv("XDG_CONFIG_HOME", (private_home + "/config").c_str(), 1);
-	setenv("XDG_RUNTIME_DIR", (private_home + "/runtime").c_str(), 1);
+		std::filesystem::create_directories(home + "/" + sub);
+	std::filesystem::permissions(home + "/runtime", std::filesystem::perms::owner_all);
+	setenv("HOME", home.c_str(), 1);
+	setenv("XDG_CACHE_HOME", (home + "/cache").c_str(), 1);
+	setenv("XDG_CONFIG_HOME", (home + "/config").c_str(), 1);
+	setenv("XDG_RUNTIME_DIR", (home + "/runtime").c_str(), 1);
 	setenv("ELM_ENGINE", "buffer", 1);
 	setenv("ECORE_NO_SYSTEM_MODULES", "1", 1);
 	setenv("ECORE_EVAS_FORCE_SYNC_RENDER", "1", 1);
@@ -57,11 +63,10 @@ void prepare_environment()
 	setenv("EINA_LOG_LEVELS", "ecore_con:0", 1);
 	setenv("ELM_PROFILE_NOSAVE", "1", 1);
 	setenv("DLOG_LEVEL", "S", 0);
-	// The platform stand-ins keep their data in the scratch home.
-	setenv("MEDIA_CONTENT_DB", (private_home + "/media.db").c_str(), 0);
-	setenv("VANTRIC_LOG_DB", (private_home + "/vantric-log.db").c_str(), 0);
-	setenv("STORAGE_INTERNAL_ROOT", private_home.c_str(), 0);
-	setenv("APP_CONTROL_LAUNCHER_DIR", (private_home + "/launchers").c_str(), 0);
+	setenv("MEDIA_CONTENT_DB", (data_dir + "/media.db").c_str(), 0);
+	setenv("VANTRIC_LOG_DB", (data_dir + "/vantric-log.db").c_str(), 0);
+	setenv("STORAGE_INTERNAL_ROOT", data_dir.c_str(), 0);
+	setenv("APP_CONTROL_LAUNCHER_DIR", (data_dir + "/launchers").c_str(), 0);
 }
 
 class ElementaryEnvironment : public ::testing::Environment {
@@ -77,8 +82,8 @@ public:
 	void TearDown() override
 	{
 		elm_shutdown();
-		if (!private_home.empty())
-			std::filesystem::remove_all(private_home);
+		if (!data_dir.empty())
+			std::filesystem::remove_all(data_dir);
 	}
 
 private:
