@@ -146,6 +146,11 @@ int main(int argc, char **argv)
 			o.screenshot = std::string(IE_DEMO_DATA_DIR) + "/editor.png";
 	}
 	default_platform_paths();
+	// gettext ignores catalogues in the C locale.
+	const char *lang = getenv("LANG");
+	if (!lang || !*lang || !strcmp(lang, "C") || !strcmp(lang, "POSIX"))
+		setenv("LANG", "C.UTF-8", 1);
+	setenv("LANGUAGE", "en", 0);
 
 	elm_init(argc, argv);
 	bindtextdomain("marlune", IE_DEMO_LOCALE_DIR);

@@ -49,7 +49,8 @@ void run_for(double seconds);
 /* Runs the main loop until every pending idler, job and zero timer ran. */
 void run_idlers();
 
-/* Input on the canvas of `win`, with a growing fake clock. */
+/* Input on the canvas of `win` (any object of that canvas will do), with a
+ * growing fake clock. */
 void mouse_move(Evas_Object *win, int x, int y);
 void mouse_down(Evas_Object *win, int x, int y);
 void mouse_up(Evas_Object *win, int x, int y);
