@@ -48,19 +48,22 @@ EA_API Eina_Bool ea_theme_object_changeable_ui_enabled_get(const Evas_Object *ob
 EA_API Eina_Bool ea_theme_object_style_set(Evas_Object *obj, Ea_Theme_Style style);
 EA_API Ea_Theme_Style ea_theme_object_style_get(const Evas_Object *obj);
 /* Applies a colour table to the object's colour classes (and remembers it
- * for ea_theme_object_color_get); a font table to its text classes. */
+ * for ea_theme_object_color_get); a font table to its text classes. The
+ * object keeps its own copy: the table may be freed before the object. */
 EA_API Eina_Bool ea_theme_object_colors_set(Evas_Object *obj, Ea_Theme_Color_Table *table, Ea_Theme_Style style);
 EA_API Eina_Bool ea_theme_object_fonts_set(Evas_Object *obj, Ea_Theme_Font_Table *table);
 
 /* Colour of a colour code as seen from `obj` (the nearest table applied to
  * it or one of its parents): the main, outline and shadow colours. Any
- * pointer may be NULL. EINA_FALSE when the code is unknown. */
+ * pointer may be NULL. EINA_FALSE when the code is unknown; the colours
+ * given back are then all 0. */
 EA_API Eina_Bool ea_theme_object_color_get(Evas_Object *obj, const char *code,
 					   int *r, int *g, int *b, int *a,
 					   int *r2, int *g2, int *b2, int *a2,
 					   int *r3, int *g3, int *b3, int *a3);
 /* Makes the item's colour class `color_class` take the colour code `code`
- * ("transparent" for none). */
+ * ("transparent" for none), on the Edje object that holds the item's
+ * content. EINA_FALSE for an unknown code or an item without content. */
 EA_API Eina_Bool ea_theme_object_item_color_replace(Elm_Object_Item *item, const char *color_class, const char *code);
 
 /* Theme change notifications. */

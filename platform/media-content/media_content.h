@@ -27,8 +27,10 @@ typedef enum {
 
 MEDIA_CONTENT_API int media_content_connect(void);
 MEDIA_CONTENT_API int media_content_disconnect(void);
-/* Inserts or updates the file's row. A missing file, a directory or a file
- * that is not a picture, video or sound gives an error and no row. Works
+/* Inserts or updates the file's row; the MIME type and pixel size come
+ * from the file's content, not its name. A missing file, a directory, or a
+ * file that is not a picture, video or sound (or whose picture header is
+ * cut short) gives MEDIA_CONTENT_ERROR_INVALID_PARAMETER and no row. Works
  * with or without a prior media_content_connect(). */
 MEDIA_CONTENT_API int media_content_scan_file(const char *path);
 
