@@ -11,6 +11,7 @@
 #include <libintl.h>
 #include <unistd.h>
 
+#include <clocale>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -151,6 +152,7 @@ int main(int argc, char **argv)
 	if (!lang || !*lang || !strcmp(lang, "C") || !strcmp(lang, "POSIX"))
 		setenv("LANG", "C.UTF-8", 1);
 	setenv("LANGUAGE", "en", 0);
+	setlocale(LC_ALL, "");
 
 	elm_init(argc, argv);
 	bindtextdomain("marlune", IE_DEMO_LOCALE_DIR);

@@ -4,6 +4,7 @@
 #include <Elementary.h>
 #include <gtest/gtest.h>
 
+#include <clocale>
 #include <cstdlib>
 #include <filesystem>
 #include <mutex>
@@ -132,6 +133,7 @@ extern "C" __attribute__((visibility("default"))) const char *__lsan_default_sup
 int main(int argc, char **argv)
 {
 	iet::prepare_environment();
+	setlocale(LC_ALL, "");
 	eina_init();
 	eina_log_print_cb_set(iet::record_eina_log, nullptr);
 	::testing::InitGoogleTest(&argc, argv);

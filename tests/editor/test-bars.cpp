@@ -1,0 +1,139 @@
+/* The function bar and the tool bar, driven by taps on their real items. */
+#include <dlfcn.h>
+
+#include "editor-fixture.h"
+#include "ie-image.h"
+
+/* Makes the toolbar's item class fail to be created, as when memory runs
+ * out: the editor's own call resolves to this definition first. */
+static bool item_class_refused;
+
+extern "C" Elm_Gengrid_Item_Class *elm_gengrid_item_class_new(void)
+{
+	if (item_class_refused)
+		return nullptr;
+	using Real = Elm_Gengrid_Item_Class *(*)(void);
+	static Real real = reinterpret_cast<Real>(dlsym(RTLD_NEXT, "elm_gengrid_item_class_new"));
+	return real();
+}
+
+namespace {
+
+class Bars : public EditorTest {
+protected:
+	/* Taps the tool bar's item `index` where it is on screen. */
+	void tap_tool(int index)
+	{
+		iet::settle();
+		Elm_Object_Item *item = elm_gengrid_first_item_get(vh->toolbar);
+		for (int i = 0; item && i < index; i++)
+			item = elm_gengrid_item_next_get(item);
+		ASSERT_NE(item, nullptr);
+		Evas_Object *track = elm_object_item_track(item);
+		int x, y;
+		iet::object_centre(track, &x, &y);
+		elm_object_item_untrack(item);
+		iet::tap(win(), x, y);
+	}
+};
+
+TEST_F(Bars, ToolPicksReachTheViewManager)
+{
+	ASSERT_NE(open_editor_on_picture(64, 48), nullptr);
+	tap_tool(3);
+	EXPECT_EQ(ie_view_mgr_get_current_view(), IE_VIEW_TYPE_EFFECT);
+	tap_tool(2);
+	EXPECT_EQ(ie_view_mgr_get_current_view(), IE_VIEW_TYPE_ROTATE_RIGHT);
+	tap_tool(1);
+	EXPECT_EQ(ie_view_mgr_get_current_view(), IE_VIEW_TYPE_ROTATE_LEFT);
+	vh->edited = EINA_TRUE;
+	tap_tool(0);
+	EXPECT_EQ(ie_view_mgr_get_current_view(), IE_VIEW_TYPE_CROP);
+	EXPECT_FALSE(vh->edited) << "crop starts from a clean slate";
+	EXPECT_EQ(vh->width, win_w);
+	EXPECT_EQ(vh->height, win_h);
+}
+
+TEST_F(Bars, RotateLeftThreeTimesTurnsThreeTimes)
+{
+	ASSERT_NE(open_editor_on_picture(64, 48), nullptr);
+	auto start = picture_pixels();
+	for (int i = 0; i < 3; i++)
+		tap_tool(1);
+	int w, h;
+	picture_size(&w, &h);
+	EXPECT_EQ(w, 48);
+	EXPECT_EQ(h, 64);
+	tap_tool(1);
+	EXPECT_EQ(picture_pixels(), start) << "a fourth turn restores the picture";
+}
+
+TEST_F(Bars, FunctionBarStartsWithDoneDisabled)
+{
+	ASSERT_NE(open_editor_on_picture(64, 48), nullptr);
+	EXPECT_STREQ(elm_object_part_text_get(vh->funcbar, "elm.text.title"), dgettext("image-editor", "IDS_ST_BODY_EDIT"));
+	EXPECT_TRUE(elm_object_disabled_get(vh->done_btn));
+	tap_tool(2);
+	EXPECT_FALSE(elm_object_disabled_get(vh->done_btn)) << "a rotation enables Done";
+}
+
+class BarsLandscape : public Bars {
+protected:
+	void SetUp() override
+	{
+		Bars::SetUp();
+		elm_win_rotation_set(win(), 90);
+	}
+};
+
+TEST_F(BarsLandscape, ToolBarIsVerticalWithLandscapeItems)
+{
+	ASSERT_NE(create_editor(), nullptr);
+	EXPECT_EQ(vh->win_rotation, 90);
+	EXPECT_FALSE(elm_gengrid_horizontal_get(vh->toolbar));
+	Evas_Coord w, h;
+	elm_gengrid_item_size_get(vh->toolbar, &w, &h);
+	EXPECT_EQ(w, 100);
+	EXPECT_EQ(h, 102);
+}
+
+TEST_F(Bars, PortraitToolBarIsHorizontalAtZeroAndHalfTurn)
+{
+	for (int rotation : {0, 180}) {
+		elm_win_rotation_set(win(), rotation);
+		ASSERT_NE(create_editor(), nullptr);
+		EXPECT_TRUE(elm_gengrid_horizontal_get(vh->toolbar));
+		Evas_Coord w, h;
+		elm_gengrid_item_size_get(vh->toolbar, &w, &h);
+		EXPECT_EQ(w, 120);
+		EXPECT_EQ(h, 100);
+		destroy_editor();
+	}
+}
+
+TEST_F(Bars, LayoutResizeFollowsTheWindowRotation)
+{
+	ASSERT_NE(open_editor_on_picture(64, 48), nullptr);
+	elm_win_rotation_set(win(), 270);
+	resize_window(1280, 720);
+	EXPECT_FALSE(elm_gengrid_horizontal_get(vh->toolbar));
+	EXPECT_EQ(vh->width, 1280);
+	EXPECT_EQ(vh->height, 720);
+}
+
+TEST_F(Bars, ToolBarWithoutItemClassLeavesAWorkingEditor)
+{
+	item_class_refused = true;
+	iet::log_clear();
+	ASSERT_NE(open_editor_on_picture(64, 48), nullptr);
+	item_class_refused = false;
+	EXPECT_EQ(iet::log_count("the toolbar item class was not created", DLOG_ERROR), 1);
+	EXPECT_EQ(elm_gengrid_items_count(vh->toolbar), 0u);
+	EXPECT_EQ(vh->toolbar_itc, nullptr);
+	EXPECT_EQ(ie_view_mgr_get_current_view(), IE_VIEW_TYPE_MAIN);
+	int w, h;
+	picture_size(&w, &h);
+	EXPECT_EQ(w, 64);
+}
+
+} // namespace

@@ -1,0 +1,153 @@
+/* The host interface: creation, loading, the back key, teardown. */
+#include "editor-fixture.h"
+#include "ie-image.h"
+
+namespace {
+
+using Shell = EditorTest;
+
+TEST_F(Shell, CreateBuildsTheEditorAndDestroyReleasesIt)
+{
+	ASSERT_NE(create_editor(), nullptr);
+	Evas_Object *layout = IE_get_view_object(vh);
+	ASSERT_NE(layout, nullptr);
+	EXPECT_STREQ(evas_object_name_get(layout), "LyIVEDITView");
+	EXPECT_EQ(vh->effect_index, -1);
+	EXPECT_NE(vh->naviframe, nullptr);
+	EXPECT_NE(vh->navi_item, nullptr);
+	EXPECT_NE(vh->funcbar, nullptr);
+	EXPECT_NE(vh->toolbar, nullptr);
+	EXPECT_NE(vh->color_table, nullptr);
+	EXPECT_NE(vh->font_table, nullptr);
+	EXPECT_TRUE(elm_object_disabled_get(vh->done_btn));
+	EXPECT_FALSE(elm_object_disabled_get(vh->cancel_btn));
+
+	int deleted = 0;
+	evas_object_event_callback_add(layout, EVAS_CALLBACK_DEL, [](void *data, Evas *, Evas_Object *, void *) {
+		++*static_cast<int *>(data);
+	}, &deleted);
+	destroy_editor();
+	EXPECT_EQ(deleted, 1);
+	EXPECT_TRUE(close_requests.empty());
+}
+
+TEST_F(Shell, OpensOnAPictureAndDestroysCleanly)
+{
+	ASSERT_NE(open_editor_on_picture(640, 480), nullptr);
+	int w, h;
+	picture_size(&w, &h);
+	EXPECT_EQ(w, 640);
+	EXPECT_EQ(h, 480);
+	EXPECT_EQ(ie_view_mgr_get_current_view(), IE_VIEW_TYPE_MAIN);
+	EXPECT_TRUE(close_requests.empty());
+}
+
+TEST_F(Shell, NullArgumentsLogTheTwoGuardLines)
+{
+	iet::log_clear();
+	EXPECT_EQ(IE_create(nullptr), nullptr);
+	EXPECT_EQ(iet::log_messages(),
+		  (std::vector<std::string>{"Invalid parameter, return NULL!", "(!(parent)) -> IE_create() return"}));
+
+	iet::log_clear();
+	EXPECT_EQ(IE_get_view_object(nullptr), nullptr);
+	EXPECT_EQ(iet::log_messages(),
+		  (std::vector<std::string>{"Invalid parameter, return NULL!",
+					    "(!(Viewhandle)) -> IE_get_view_object() return"}));
+
+	iet::log_clear();
+	IE_destroy(nullptr);
+	EXPECT_EQ(iet::log_messages(),
+		  (std::vector<std::string>{"Invalid parameter, return!", "(!(data)) -> _ie_log_manager_destroy() return",
+					    "Invalid parameter, return!", "(!(Viewhandle)) -> IE_destroy() return"}));
+	for (const auto &line : iet::log_lines()) {
+		EXPECT_EQ(line.tag, "IV-EDITOR");
+		EXPECT_EQ(line.priority, DLOG_ERROR);
+		EXPECT_NE(line.text.find("\033[31m"), std::string::npos) << line.text;
+	}
+
+	iet::log_clear();
+	IE_setparam(nullptr, "/nonexistent.jpg", 720, 1280, 0);
+	IE_pause(nullptr);
+	IE_resume(nullptr);
+	EXPECT_TRUE(iet::log_lines().empty());
+}
+
+TEST_F(Shell, SetparamSwapsTheBoxForQuarterTurns)
+{
+	ASSERT_NE(create_editor(), nullptr);
+	std::string dir = iet::temp_dir();
+	std::string path = dir + "/p.png";
+	ASSERT_TRUE(iet::write_picture(path, 64, 48));
+	IE_setparam(vh, path.c_str(), 720, 1280, 90);
+	EXPECT_EQ(vh->width, 1280);
+	EXPECT_EQ(vh->height, 720);
+	destroy_editor();
+
+	for (int rotation : {0, 180}) {
+		ASSERT_NE(create_editor(), nullptr);
+		IE_setparam(vh, path.c_str(), 720, 1280, rotation);
+		EXPECT_EQ(vh->width, 720);
+		EXPECT_EQ(vh->height, 1280);
+		destroy_editor();
+	}
+	ASSERT_NE(create_editor(), nullptr);
+	IE_setparam(vh, path.c_str(), 720, 1280, 270);
+	EXPECT_EQ(vh->width, 1280);
+	EXPECT_EQ(vh->height, 720);
+}
+
+TEST_F(Shell, UnloadablePictureClosesOnceFromTheMainLoop)
+{
+	ASSERT_NE(create_editor(), nullptr);
+	std::string dir = iet::temp_dir();
+	IE_setparam(vh, (dir + "/missing.jpg").c_str(), 720, 1280, 0);
+	EXPECT_EQ(vh->main_image, nullptr);
+	EXPECT_TRUE(close_requests.empty()) << "the close request must wait for the main loop";
+	iet::run_idlers();
+	ASSERT_EQ(close_requests.size(), 1u);
+	EXPECT_EQ(close_requests[0], "");
+	destroy_editor();
+	iet::run_idlers();
+	EXPECT_EQ(close_requests.size(), 1u);
+}
+
+TEST_F(Shell, DestroyWithThePendingCloseRequestIsSafe)
+{
+	ASSERT_NE(create_editor(), nullptr);
+	IE_setparam(vh, "/nonexistent/picture.jpg", 720, 1280, 0);
+	destroy_editor();
+	iet::run_idlers();
+	EXPECT_TRUE(close_requests.empty());
+}
+
+TEST_F(Shell, BackKeyIsCancelAndNeverPopsTheItem)
+{
+	ASSERT_NE(open_editor_on_picture(320, 240), nullptr);
+	Elm_Object_Item *item = vh->navi_item;
+	iet::key_press(win(), "Escape");
+	EXPECT_EQ(elm_naviframe_top_item_get(vh->naviframe), item);
+	EXPECT_EQ(eina_list_count(elm_naviframe_items_get(vh->naviframe)), 1u);
+	ASSERT_EQ(close_requests.size(), 1u) << "back in the main view with nothing edited closes";
+	EXPECT_EQ(close_requests[0], "");
+
+	vh->edited = EINA_TRUE;
+	iet::key_press(win(), "XF86Back");
+	EXPECT_EQ(elm_naviframe_top_item_get(vh->naviframe), item);
+	EXPECT_NE(vh->popup, nullptr) << "with changes the back key asks first";
+	EXPECT_EQ(close_requests.size(), 1u);
+}
+
+TEST_F(Shell, PauseAndResumeChangeNothing)
+{
+	ASSERT_NE(open_editor_on_picture(320, 240), nullptr);
+	auto before = picture_pixels();
+	IE_pause(vh);
+	IE_resume(vh);
+	iet::settle();
+	EXPECT_EQ(picture_pixels(), before);
+	EXPECT_EQ(ie_view_mgr_get_current_view(), IE_VIEW_TYPE_MAIN);
+	EXPECT_TRUE(close_requests.empty());
+}
+
+} // namespace
