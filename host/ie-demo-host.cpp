@@ -102,6 +102,7 @@ void headless_environment()
 	setenv("ECORE_EVAS_RENDER_NOSYNC", "1", 1);
 	setenv("ECORE_NO_SYSTEM_MODULES", "1", 0);
 	setenv("EINA_LOG_BACKTRACE", "-1", 0);
+	setenv("EINA_LOG_LEVELS", "ecore_con:0", 0);
 	setenv("ELM_PROFILE_NOSAVE", "1", 0);
 }
 
