@@ -1,4 +1,6 @@
 /* The host interface: creation, loading, the back key, teardown. */
+#include <filesystem>
+
 #include "editor-fixture.h"
 #include "ie-image.h"
 
@@ -110,6 +112,23 @@ TEST_F(Shell, UnloadablePictureClosesOnceFromTheMainLoop)
 	destroy_editor();
 	iet::run_idlers();
 	EXPECT_EQ(close_requests.size(), 1u);
+}
+
+TEST_F(Shell, PictureFailingInTheBackgroundClosesOnce)
+{
+	ASSERT_NE(create_editor(), nullptr);
+	/* Large enough to be decoded in the background, cut in its pixels. */
+	std::string path = iet::temp_dir() + "/damaged.png";
+	ASSERT_TRUE(iet::write_picture(path, 4000, 3000));
+	std::filesystem::resize_file(path, std::filesystem::file_size(path) / 2);
+	evas_image_cache_flush(evas());
+	IE_setparam(vh, path.c_str(), 720, 1280, 0);
+	ASSERT_NE(vh->main_image, nullptr) << "the damage shows only once decoding runs";
+	EXPECT_TRUE(iet::run_until([this] { return !close_requests.empty(); }, 10.0));
+	iet::run_for(0.2);
+	ASSERT_EQ(close_requests.size(), 1u);
+	EXPECT_EQ(close_requests[0], "");
+	destroy_editor();
 }
 
 TEST_F(Shell, DestroyWithThePendingCloseRequestIsSafe)

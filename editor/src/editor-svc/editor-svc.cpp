@@ -187,6 +187,13 @@ static void _on_layout_moved(void *, Evas *, Evas_Object *, void *)
 {
 }
 
+/* A picture loaded in the background can still turn out unreadable: the
+ * editor then closes as for any picture that cannot be loaded. */
+static void _on_image_load_failed(void *data, Evas_Object *, void *)
+{
+	ie_idler_add(static_cast<Viewhandle *>(data), _request_close_idler);
+}
+
 void IE_setparam(Viewhandle *vh, const char *path, int width, int height, int rotation)
 {
 	if (!vh)
@@ -208,6 +215,7 @@ void IE_setparam(Viewhandle *vh, const char *path, int width, int height, int ro
 		return;
 	}
 
+	evas_object_smart_callback_add(vh->main_image, IE_IMAGE_SIGNAL_LOAD_FAILED, _on_image_load_failed, vh);
 	evas_object_size_hint_align_set(vh->main_image, 0.5, 0.5);
 	evas_object_size_hint_weight_set(vh->scroller, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
 	evas_object_size_hint_align_set(vh->scroller, EVAS_HINT_FILL, EVAS_HINT_FILL);

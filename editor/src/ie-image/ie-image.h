@@ -17,6 +17,11 @@ enum {
 	IE_IMAGE_MODE_ACTIVE = 3
 };
 
+/* Smart callback of the main image when a background load, already
+ * reported as started, cannot decode the picture after all. The picture
+ * stays empty; the owner may delete the object from the callback. */
+#define IE_IMAGE_SIGNAL_LOAD_FAILED "load,failed"
+
 Evas_Object *ie_image_add(Evas_Object *parent);
 Eina_Bool ie_image_file_load(Evas_Object *obj, const char *path, int width, int height);
 void *ie_image_data_get(Evas_Object *obj);

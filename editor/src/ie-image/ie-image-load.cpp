@@ -1,0 +1,463 @@
+/* Puts the picture into the main image object. A picture with more pixels
+ * than the host's box is reduced so that its long side equals the box's
+ * longer side: small reductions at once (decoder scale-down, then a
+ * bilinear resample), large ones and GIF/WBMP in an offscreen buffer canvas
+ * preloaded in the background while a processing popup shows. */
+#include <Ecore_Evas.h>
+#include <Elementary.h>
+
+#include <libintl.h>
+
+#include <algorithm>
+#include <cstdint>
+#include <cstdlib>
+#include <cstring>
+#include <iterator>
+#include <memory>
+
+#include "editor-svc-private.h"
+#include "ie-engine.h"
+#include "ie-image-private.h"
+
+namespace {
+
+constexpr const char *PRELOAD_EE_KEY = "Ecore_Evas";
+constexpr const char *PRELOAD_WIDTH_KEY = "preload_object_width";
+constexpr const char *PRELOAD_HEIGHT_KEY = "preload_object_height";
+constexpr const char *PROGRESSBAR_KEY = "progressbar";
+
+/* Formats the decoder cannot scale down; always loaded in the background. */
+constexpr const char *ASYNC_FORMAT_MARKS[] = { ".gif", ".GIF", ".wbmp", ".WBMP" };
+
+/* Evas keeps image sides below this; a larger target cannot be held. */
+constexpr int MAX_IMAGE_SIDE = 32767;
+
+enum class Load_Path { FULL_SIZE, RESAMPLED, ASYNC };
+
+struct Load_Plan {
+	Load_Path path;
+	int scale_down; /* decoder scale-down factor, 0 for none */
+	int target_w, target_h;
+};
+
+struct Evas_Object_Deleter {
+	void operator()(Evas_Object *obj) const { evas_object_del(obj); }
+};
+using Evas_Object_Ptr = std::unique_ptr<Evas_Object, Evas_Object_Deleter>;
+
+struct Free_Deleter {
+	void operator()(void *p) const { free(p); }
+};
+
+} // namespace
+
+static void _print_image_load_err(Evas_Load_Error error)
+{
+	IE_LOG_E("could not load image. error string is \"%s\"\n", evas_load_error_str(error));
+}
+
+/* Chooses how a picture of iw x ih goes into a box of box_w x box_h. Sizes
+ * are multiplied in 64 bits: the host's box and the file's header are not
+ * trusted to keep products within int. */
+static bool _load_plan_get(const char *path, int iw, int ih, int box_w, int box_h, Load_Plan *plan)
+{
+	if (iw <= 0 || ih <= 0 || box_w < 0 || box_h < 0)
+		return false;
+
+	if ((int64_t)iw * ih <= (int64_t)box_w * box_h) {
+		*plan = { Load_Path::FULL_SIZE, 0, iw, ih };
+		return true;
+	}
+
+	int64_t longest = std::max(box_w, box_h);
+	if (longest <= 0)
+		return false;
+
+	int64_t tw, th, r;
+	if (iw > ih) {
+		tw = longest;
+		th = longest * ih / iw;
+		r = iw;
+	} else {
+		th = longest;
+		tw = longest * iw / ih;
+		r = ih;
+	}
+	/* A very thin picture must not shrink to nothing on its short side. */
+	tw = std::max<int64_t>(tw, 1);
+	th = std::max<int64_t>(th, 1);
+	if (tw > MAX_IMAGE_SIDE || th > MAX_IMAGE_SIDE)
+		return false;
+	plan->target_w = (int)tw;
+	plan->target_h = (int)th;
+
+	bool async_format = std::any_of(std::begin(ASYNC_FORMAT_MARKS), std::end(ASYNC_FORMAT_MARKS),
+					[path](const char *mark) { return strstr(path, mark) != NULL; });
+	if (async_format) {
+		plan->path = Load_Path::ASYNC;
+		plan->scale_down = 0;
+	} else if (r <= 2 * longest) {
+		plan->path = Load_Path::RESAMPLED;
+		plan->scale_down = 1;
+	} else if (r <= 3 * longest) {
+		plan->path = Load_Path::RESAMPLED;
+		plan->scale_down = 2;
+	} else if (r <= 4 * longest) {
+		plan->path = Load_Path::ASYNC;
+		plan->scale_down = 3;
+	} else {
+		plan->path = Load_Path::ASYNC;
+		plan->scale_down = 4;
+	}
+	return true;
+}
+
+/* Decodes the image's pixels now, so that a damaged or oversized file fails
+ * the load instead of showing an empty picture later. */
+static const void *_image_pixels_decode(Evas_Object *image)
+{
+	const void *pixels = evas_object_image_data_get(image, EINA_FALSE);
+	Evas_Load_Error error = evas_object_image_load_error_get(image);
+	if (error != EVAS_LOAD_ERROR_NONE) {
+		_print_image_load_err(error);
+		return NULL;
+	}
+	if (!pixels)
+		_print_image_load_err(EVAS_LOAD_ERROR_GENERIC);
+	return pixels;
+}
+
+static bool _load_full_size(Mainimg_Smart_Data *sd, const char *path, const Load_Plan &plan)
+{
+	evas_object_image_load_orientation_set(sd->image, EINA_TRUE);
+	evas_object_image_file_set(sd->image, path, NULL);
+	const void *pixels = _image_pixels_decode(sd->image);
+	if (!pixels) {
+		evas_object_image_file_set(sd->image, NULL, NULL);
+		return false;
+	}
+	/* Read-only access ends here; Evas keeps the decoded pixels. */
+	evas_object_image_data_set(sd->image, const_cast<void *>(pixels));
+	sd->img_w = plan.target_w;
+	sd->img_h = plan.target_h;
+	return true;
+}
+
+static bool _load_resampled(Mainimg_Smart_Data *sd, const char *path, const Load_Plan &plan)
+{
+	Evas_Object *image = sd->image;
+	evas_object_image_load_orientation_set(image, EINA_TRUE);
+	/* Load options go before the file, so the header is read only once. */
+	evas_object_image_load_scale_down_set(image, plan.scale_down);
+	evas_object_image_file_set(image, path, NULL);
+
+	const void *pixels = _image_pixels_decode(image);
+	int sw = 0, sh = 0;
+	evas_object_image_size_get(image, &sw, &sh);
+	if (!pixels || sw <= 0 || sh <= 0) {
+		evas_object_image_file_set(image, NULL, NULL);
+		return false;
+	}
+
+	size_t bytes = 0;
+	std::unique_ptr<uint8_t, Free_Deleter> buf;
+	if (!__builtin_mul_overflow((size_t)plan.target_w * (size_t)plan.target_h, (size_t)4, &bytes))
+		buf.reset(static_cast<uint8_t *>(calloc(1, bytes)));
+	if (!buf) {
+		IE_LOG_E("inter.pbBuf is null ,Calloc failed");
+		evas_object_image_file_set(image, NULL, NULL);
+		return false;
+	}
+
+	IEL_Image src = { (uint32_t)sw, (uint32_t)sh, IEL_FORMAT_BGRA8888,
+			  static_cast<uint8_t *>(const_cast<void *>(pixels)) };
+	IEL_Image inter = { (uint32_t)plan.target_w, (uint32_t)plan.target_h, IEL_FORMAT_BGRA8888, buf.get() };
+	int result = IEL_Resize_Image(&src, &inter);
+	if (result != IEL_OK) {
+		IE_LOG_E("IEL_Resize_Image failed (%d)", result);
+		evas_object_image_file_set(image, NULL, NULL);
+		return false;
+	}
+
+	/* From here the pixels are ours, not the file's: Evas must never reload
+	 * the full-size file over them. */
+	Eina_Bool alpha = evas_object_image_alpha_get(image);
+	evas_object_image_file_set(image, NULL, NULL);
+	evas_object_image_alpha_set(image, alpha);
+	evas_object_image_size_set(image, plan.target_w, plan.target_h);
+	evas_object_image_data_copy_set(image, buf.get());
+	sd->img_w = plan.target_w;
+	sd->img_h = plan.target_h;
+	return true;
+}
+
+static void _processing_popup_back_cb(void *data, Evas_Object *obj, void *event_info)
+{
+	/* The back key waits for the picture. */
+	(void)data;
+	(void)obj;
+	(void)event_info;
+}
+
+/* The popup lives on the parent: if the parent goes first, forget it. */
+static void _processing_popup_deleted_cb(void *data, Evas *e, Evas_Object *popup, void *event_info)
+{
+	(void)e;
+	(void)event_info;
+	auto *sd = static_cast<Mainimg_Smart_Data *>(data);
+	if (sd->processing_popup == popup)
+		sd->processing_popup = NULL;
+}
+
+static Evas_Object *_processing_popup_create(Mainimg_Smart_Data *sd)
+{
+	Evas_Object *popup = elm_popup_add(sd->parent);
+	if (!popup) {
+		IE_LOG_E("Cannot create processing popup");
+		return NULL;
+	}
+	elm_popup_align_set(popup, ELM_NOTIFY_ALIGN_FILL, 1.0);
+	ea_object_event_callback_add(popup, EA_CALLBACK_BACK, _processing_popup_back_cb, NULL);
+	evas_object_size_hint_weight_set(popup, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
+
+	Evas_Object *layout = elm_layout_add(popup);
+	if (!elm_layout_file_set(layout, IE_EDJ_FILE, "processing_view_layout"))
+		IE_LOG_E("Layout file set failed! %s in %s", "processing_view_layout", IE_EDJ_FILE);
+	evas_object_size_hint_weight_set(layout, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
+	elm_object_part_text_set(layout, "elm.text", dgettext(IE_TEXT_DOMAIN, "IDS_360V_TPOP_LOADING_ING"));
+
+	Evas_Object *progressbar = elm_progressbar_add(layout);
+	elm_object_style_set(progressbar, "process_medium");
+	evas_object_size_hint_align_set(progressbar, EVAS_HINT_FILL, 0.5);
+	evas_object_size_hint_weight_set(progressbar, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
+	/* Pulsing needs pulse mode first; without it the bar stands still. */
+	elm_progressbar_pulse_set(progressbar, EINA_TRUE);
+	elm_progressbar_pulse(progressbar, EINA_TRUE);
+	elm_object_part_content_set(layout, "processing", progressbar);
+
+	elm_object_part_content_set(popup, NULL, layout);
+	evas_object_data_set(popup, PROGRESSBAR_KEY, progressbar);
+	evas_object_event_callback_add(popup, EVAS_CALLBACK_DEL, _processing_popup_deleted_cb, sd);
+	evas_object_show(popup);
+	return popup;
+}
+
+void _processing_popup_del(Mainimg_Smart_Data *sd)
+{
+	if (!sd->processing_popup)
+		return;
+	Evas_Object *popup = sd->processing_popup;
+	sd->processing_popup = NULL;
+	evas_object_event_callback_del_full(popup, EVAS_CALLBACK_DEL, _processing_popup_deleted_cb, sd);
+	evas_object_del(popup);
+}
+
+static void _on_image_preloaded(void *data, Evas *e, Evas_Object *preload_image, void *event_info);
+
+void _preload_release(Mainimg_Smart_Data *sd)
+{
+	if (sd->load_failed_job) {
+		ecore_job_del(sd->load_failed_job);
+		sd->load_failed_job = NULL;
+	}
+	if (!sd->preload_image)
+		return;
+	Evas_Object *preload_image = sd->preload_image;
+	sd->preload_image = NULL;
+	Ecore_Evas *ee = ecore_evas_object_ecore_evas_get(preload_image);
+	evas_object_event_callback_del_full(preload_image, EVAS_CALLBACK_IMAGE_PRELOADED, _on_image_preloaded,
+					    sd->obj);
+	evas_object_del(preload_image);
+	if (ee)
+		ecore_evas_free(ee);
+}
+
+/* The offscreen image is only needed until its pixels are copied out. */
+static void _preload_image_drop_file(Evas_Object *preload_image)
+{
+	evas_object_hide(preload_image);
+	evas_object_image_preload(preload_image, EINA_TRUE);
+	evas_object_image_file_set(preload_image, NULL, NULL);
+}
+
+static void _load_failed_job_cb(void *data)
+{
+	Mainimg_Smart_Data *sd = _mainimg_data_get(static_cast<Evas_Object *>(data));
+	if (!sd)
+		return;
+	sd->load_failed_job = NULL;
+	evas_object_smart_callback_call(sd->obj, IE_IMAGE_SIGNAL_LOAD_FAILED, NULL);
+}
+
+static void _on_image_preloaded(void *data, Evas *e, Evas_Object *preload_image, void *event_info)
+{
+	(void)e;
+	(void)event_info;
+	Mainimg_Smart_Data *sd = _mainimg_data_get(static_cast<Evas_Object *>(data));
+	if (!sd || sd->preload_image != preload_image)
+		return;
+
+	/* A file that fails while decoding would render as an empty canvas:
+	 * such pixels must not pass for the picture. */
+	bool failed = false;
+	Evas_Load_Error error = evas_object_image_load_error_get(preload_image);
+	if (error != EVAS_LOAD_ERROR_NONE) {
+		_print_image_load_err(error);
+		failed = true;
+	} else {
+		Ecore_Evas *ee = ecore_evas_object_ecore_evas_get(preload_image);
+		evas_object_show(preload_image);
+		const void *pixels = ee ? ecore_evas_buffer_pixels_get(ee) : NULL;
+		int tw = (int)(intptr_t)evas_object_data_get(preload_image, PRELOAD_WIDTH_KEY);
+		int th = (int)(intptr_t)evas_object_data_get(preload_image, PRELOAD_HEIGHT_KEY);
+		if (pixels) {
+			evas_object_image_size_set(sd->image, tw, th);
+			evas_object_image_data_copy_set(sd->image, const_cast<void *>(pixels));
+		} else {
+			IE_LOG_E("offscreen canvas gave no pixels");
+			failed = true;
+		}
+	}
+
+	if (sd->processing_popup)
+		_processing_popup_del(sd);
+	else
+		sd->preloaded = EINA_TRUE;
+
+	/* Reported from inside evas_object_image_preload: the load has not
+	 * returned yet, so it drops the file and reports any failure itself. */
+	if (sd->preload_starting) {
+		sd->preload_failed = failed;
+		return;
+	}
+	_preload_image_drop_file(preload_image);
+	if (failed && !sd->load_failed_job)
+		sd->load_failed_job = ecore_job_add(_load_failed_job_cb, sd->obj);
+}
+
+static bool _load_async(Mainimg_Smart_Data *sd, const char *path, const Load_Plan &plan)
+{
+	const int tw = plan.target_w, th = plan.target_h;
+	/* The canvas only ever renders the target size: no need for a
+	 * full-size buffer first. */
+	Ecore_Evas *ee = ecore_evas_buffer_new(tw, th);
+	if (!ee) {
+		IE_LOG_E("Cannot create offscreen canvas %dx%d", tw, th);
+		return false;
+	}
+	Evas_Object *preload_image = evas_object_image_filled_add(ecore_evas_get(ee));
+	if (!preload_image) {
+		IE_LOG_E("Cannot create offscreen image");
+		ecore_evas_free(ee);
+		return false;
+	}
+	sd->preload_image = preload_image;
+	sd->preloaded = EINA_FALSE;
+	evas_object_image_load_orientation_set(preload_image, EINA_TRUE);
+	evas_object_data_set(preload_image, PRELOAD_EE_KEY, ee);
+	evas_object_event_callback_add(preload_image, EVAS_CALLBACK_IMAGE_PRELOADED, _on_image_preloaded, sd->obj);
+
+	if (plan.scale_down > 0)
+		evas_object_image_load_scale_down_set(preload_image, plan.scale_down);
+	evas_object_image_file_set(preload_image, path, NULL);
+	Evas_Load_Error error = evas_object_image_load_error_get(preload_image);
+	if (error != EVAS_LOAD_ERROR_NONE)
+		_print_image_load_err(error);
+
+	evas_object_image_fill_set(preload_image, 0, 0, tw, th);
+	evas_object_resize(preload_image, tw, th);
+	evas_object_data_set(preload_image, PRELOAD_WIDTH_KEY, (void *)(intptr_t)tw);
+	evas_object_data_set(preload_image, PRELOAD_HEIGHT_KEY, (void *)(intptr_t)th);
+
+	sd->preload_starting = EINA_TRUE;
+	sd->preload_failed = EINA_FALSE;
+	evas_object_image_preload(preload_image, EINA_FALSE);
+	sd->preload_starting = EINA_FALSE;
+
+	if (sd->preload_failed) {
+		_preload_release(sd);
+		return false;
+	}
+	if (sd->preloaded)
+		_preload_image_drop_file(preload_image);
+	else
+		sd->processing_popup = _processing_popup_create(sd);
+
+	sd->img_w = tw;
+	sd->img_h = th;
+	return true;
+}
+
+Eina_Bool ie_image_file_load(Evas_Object *obj, const char *path, int width, int height)
+{
+	IE_CHECK_VAL(obj, EINA_FALSE);
+	IE_CHECK_VAL(path, EINA_FALSE);
+	Mainimg_Smart_Data *sd = _mainimg_data_get(obj);
+	IE_CHECK_VAL(sd, EINA_FALSE);
+
+	if (sd->loaded) {
+		sd->loaded = EINA_FALSE;
+		free(sd->path);
+		sd->path = NULL;
+		return EINA_FALSE;
+	}
+	/* A background load of an earlier picture must not land on this one. */
+	_preload_release(sd);
+	_processing_popup_del(sd);
+
+	Evas_Object_Ptr probe(evas_object_image_add(evas_object_evas_get(obj)));
+	if (!probe) {
+		IE_LOG_E("Cannot create probe image");
+		return EINA_FALSE;
+	}
+	evas_object_image_load_orientation_set(probe.get(), EINA_TRUE);
+	evas_object_image_file_set(probe.get(), path, NULL);
+	Evas_Load_Error error = evas_object_image_load_error_get(probe.get());
+	if (error != EVAS_LOAD_ERROR_NONE) {
+		_print_image_load_err(error);
+		return EINA_FALSE;
+	}
+
+	int iw = 0, ih = 0;
+	evas_object_image_size_get(probe.get(), &iw, &ih);
+	Load_Plan plan;
+	if (!_load_plan_get(path, iw, ih, width, height, &plan)) {
+		IE_LOG_E("Cannot hold a %dx%d picture in a %dx%d box", iw, ih, width, height);
+		return EINA_FALSE;
+	}
+
+	bool ok = false;
+	switch (plan.path) {
+	case Load_Path::FULL_SIZE:
+		ok = _load_full_size(sd, path, plan);
+		break;
+	case Load_Path::RESAMPLED:
+		ok = _load_resampled(sd, path, plan);
+		break;
+	case Load_Path::ASYNC:
+		ok = _load_async(sd, path, plan);
+		break;
+	}
+	if (!ok)
+		return EINA_FALSE;
+
+	sd->path = strdup(path);
+	if (!sd->path) {
+		IE_LOG_E("Cannot copy the path");
+		_preload_release(sd);
+		_processing_popup_del(sd);
+		return EINA_FALSE;
+	}
+	sd->loaded = EINA_TRUE;
+	evas_object_smart_changed(obj);
+	evas_object_show(obj);
+	return EINA_TRUE;
+}
+
+void *ie_image_data_get(Evas_Object *obj)
+{
+	IE_CHECK_NULL(obj);
+	Mainimg_Smart_Data *sd = _mainimg_data_get(obj);
+	IE_CHECK_NULL(sd);
+	return evas_object_image_data_get(sd->image, EINA_TRUE);
+}
