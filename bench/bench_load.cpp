@@ -21,6 +21,7 @@
 #include <vector>
 
 #include "bench-common.h"
+#include "bench-efl.h"
 #include "ie-image.h"
 
 extern char **environ;
@@ -34,34 +35,6 @@ constexpr int kSourceH = 3000;
 constexpr int kThumbnailSize = 1280;
 constexpr const char *kVipsReference = "vipsthumbnail_4000x3000_to_1280";
 
-/* One headless window for the whole run, made on first use. */
-Evas_Object *bench_window()
-{
-	static Evas_Object *win = [] {
-		const std::string home = std::filesystem::temp_directory_path() / "ie-bench-efl-home";
-		for (const char *sub : { "cache", "config", "runtime" })
-			std::filesystem::create_directories(home + "/" + sub);
-		std::filesystem::permissions(home + "/runtime", std::filesystem::perms::owner_all);
-		setenv("HOME", home.c_str(), 0);
-		setenv("XDG_CACHE_HOME", (home + "/cache").c_str(), 0);
-		setenv("XDG_CONFIG_HOME", (home + "/config").c_str(), 0);
-		setenv("XDG_RUNTIME_DIR", (home + "/runtime").c_str(), 0);
-		setenv("ELM_ENGINE", "buffer", 1);
-		setenv("ECORE_NO_SYSTEM_MODULES", "1", 0);
-		setenv("ECORE_EVAS_FORCE_SYNC_RENDER", "1", 1);
-		setenv("ECORE_EVAS_RENDER_NOSYNC", "1", 1);
-		setenv("EINA_LOG_BACKTRACE", "-1", 0);
-		setenv("ELM_PROFILE_NOSAVE", "1", 0);
-		setenv("DLOG_LEVEL", "S", 0);
-		elm_init(0, nullptr);
-		Evas_Object *w = elm_win_add(nullptr, "ie-bench", ELM_WIN_BASIC);
-		evas_object_resize(w, kBoxW, kBoxH);
-		evas_object_show(w);
-		return w;
-	}();
-	return win;
-}
-
 /* A photo-like 4000x3000 JPEG, written once per run. */
 const std::string &source_jpeg()
 {
@@ -73,7 +46,7 @@ const std::string &source_jpeg()
 		std::atexit([] { std::filesystem::remove_all(scratch); });
 		std::string file = dir + "/photo.jpg";
 		std::vector<uint8_t> pixels = bench::photo_bgra(kSourceW, kSourceH, 2024);
-		Evas_Object *img = evas_object_image_add(evas_object_evas_get(bench_window()));
+		Evas_Object *img = evas_object_image_add(evas_object_evas_get(bench::efl_window(kBoxW, kBoxH)));
 		evas_object_image_alpha_set(img, EINA_FALSE);
 		evas_object_image_size_set(img, kSourceW, kSourceH);
 		evas_object_image_data_copy_set(img, pixels.data());
@@ -156,7 +129,7 @@ void Editor_Open_4000x3000_in_720x1280(benchmark::State &state)
 		state.SkipWithError("no source picture");
 		return;
 	}
-	Evas_Object *win = bench_window();
+	Evas_Object *win = bench::efl_window(kBoxW, kBoxH);
 	double total = 0.0;
 	for (auto _ : state) {
 		/* Each open decodes the file, as a first open does. */

@@ -1,0 +1,50 @@
+#include "engine-effects.h"
+
+namespace pee {
+
+/* Cartoon: flat areas of clean colour inside dark ink outlines. The
+ * picture is flattened with a Kuwahara filter, its brightness is cut into
+ * a few flat bands (colours keep their hue), and ink is laid where a
+ * difference of Gaussians finds the dark side of an edge. `outline` sets
+ * the width of the ink. */
+int cartoon(const uint8_t *in, uint8_t *out, int width, int height, Weight outline)
+{
+	return kit::guarded([&] {
+		const float extent = float(std::max(width, height));
+		kit::Rgb flat = kuwahara(in, width, height, std::max(2, int(extent / 240.f)));
+
+		constexpr float OUTLINE_SCALE[3] = {0.7f, 1.f, 1.5f};
+		const float sigma = std::max(0.7f, extent / 1100.f) * OUTLINE_SCALE[outline - 1];
+		kit::Plane narrow = luma_rgb888(in, width, height);
+		kit::Plane wide = narrow;
+		kit::gaussian_blur(narrow, sigma);
+		kit::gaussian_blur(wide, sigma * 1.6f);
+
+		/* Brightness bands: six equal steps, each shown a little above
+		 * its middle. */
+		constexpr float BAND = 255.f / 6.f;
+		/* Each channel's distance from the brightness, boosted a little,
+		 * is rounded to steps of this size: few hues per band. */
+		constexpr float STEP = 14.f;
+		for (size_t i = 0; i < narrow.v.size(); ++i) {
+			float r = flat.r.v[i], g = flat.g.v[i], b = flat.b.v[i];
+			float l = 0.299f * r + 0.587f * g + 0.114f * b;
+			float banded = (float(int(l / BAND)) + 0.6f) * BAND;
+			float edge = narrow.v[i] - wide.v[i];
+			float ink = kit::smoothstep(1.5f, 5.f, -edge);
+			/* Ink in four strengths: soft enough at its rim, flat like
+			 * the colours. */
+			float keep = 1.f - 0.9f * float(int(ink * 3.f + 0.5f)) / 3.f;
+			float *c[3] = {&flat.r.v[i], &flat.g.v[i], &flat.b.v[i]};
+			for (float *v : c) {
+				float steps = (*v - l) * 1.3f / STEP;
+				float chroma = float(int(steps + (steps < 0.f ? -0.5f : 0.5f))) * STEP;
+				*v = std::clamp(banded + chroma, 0.f, 255.f) * keep;
+			}
+		}
+		write_rgb888(flat, out);
+		return int(kit::RESULT_OK);
+	});
+}
+
+} // namespace pee

@@ -1,0 +1,91 @@
+#include "engine-effects.h"
+
+namespace pee {
+namespace {
+
+/* Bristle streaks: position-hashed noise averaged along the strokes, which
+ * run across the gradient of `flow` (diagonally where it is flat). */
+kit::Plane bristle_streaks(const kit::Plane &flow, float step)
+{
+	const int width = flow.width, height = flow.height;
+	std::vector<uint8_t> noise(size_t(width) * size_t(height));
+	for (int y = 0; y < height; ++y)
+		for (int x = 0; x < width; ++x)
+			noise[size_t(y) * size_t(width) + size_t(x)] = uint8_t(kit::hash2(uint32_t(x), uint32_t(y), 0x011) >> 24);
+	constexpr int TAPS = 3;
+	constexpr float INVERSE_TAPS = 1.f / float(2 * TAPS + 1);
+	kit::Plane streaks(width, height);
+	for (int y = 0; y < height; ++y) {
+		const float *up = &flow.v[size_t(std::max(y - 1, 0)) * size_t(width)];
+		const float *mid = &flow.v[size_t(y) * size_t(width)];
+		const float *down = &flow.v[size_t(std::min(y + 1, height - 1)) * size_t(width)];
+		for (int x = 0; x < width; ++x) {
+			float gx = mid[std::min(x + 1, width - 1)] - mid[std::max(x - 1, 0)];
+			float gy = down[x] - up[x];
+			float len = std::sqrt(gx * gx + gy * gy);
+			float weight = std::min(1.f, len * 0.5f);
+			float inverse = weight / std::max(len, 1e-3f);
+			float tx = (-gy * inverse + 0.7071f * (1.f - weight)) * step;
+			float ty = (gx * inverse + 0.7071f * (1.f - weight)) * step;
+			float sum = 0.f;
+			for (int k = -TAPS; k <= TAPS; ++k) {
+				int sx = std::clamp(x + int(float(k) * tx), 0, width - 1);
+				int sy = std::clamp(y + int(float(k) * ty), 0, height - 1);
+				sum += float(noise[size_t(sy) * size_t(width) + size_t(sx)]);
+			}
+			streaks.v[size_t(y) * size_t(width) + size_t(x)] = sum * INVERSE_TAPS;
+		}
+	}
+	return streaks;
+}
+
+} // namespace
+
+/* Oil paint: thick brush strokes. A wide Kuwahara filter turns the
+ * picture into dabs of flat colour; bristle streaks follow the strokes,
+ * and the streaks and the dabs' borders are lit from the top left as if
+ * the paint stood up from the canvas. */
+int oil_paint(const uint8_t *in, uint8_t *out, int width, int height)
+{
+	return kit::guarded([&] {
+		const float extent = float(std::max(width, height));
+		kit::Rgb paint = kuwahara(in, width, height, std::max(2, int(extent / 160.f)));
+
+		kit::Plane relief = kit::luma_plane(paint);
+		/* Streaks are drawn on a half-size grid on large pictures: they
+		 * are several pixels long there anyway. */
+		const int grid = extent >= 640.f ? 2 : 1;
+		kit::Plane flow = grid > 1 ? kit::shrink(relief, grid) : relief;
+		kit::gaussian_blur(flow, std::max(1.f, extent / 300.f / float(grid)));
+		kit::Plane streaks = bristle_streaks(flow, std::max(1.f, extent / 420.f / float(grid)));
+		if (grid > 1) {
+			kit::Plane full(width, height);
+			kit::expand_into(streaks, grid, full);
+			streaks = std::move(full);
+		}
+		kit::gaussian_blur(relief, std::max(0.6f, extent / 1600.f));
+
+		/* Bristle marks are finer than a pixel of a thumbnail: there they
+		 * would only add noise, so they fade with the picture's size. */
+		const float bristle_depth = 0.9f * std::clamp(extent / 1280.f, 0.3f, 1.f);
+		for (int y = 0; y < height; ++y) {
+			const size_t above = size_t(std::max(y - 1, 0)) * size_t(width);
+			const size_t below = size_t(std::min(y + 1, height - 1)) * size_t(width);
+			const size_t row = size_t(y) * size_t(width);
+			for (int x = 0; x < width; ++x) {
+				const size_t left = size_t(std::max(x - 1, 0)), right = size_t(std::min(x + 1, width - 1));
+				float edge_light = relief.v[above + left] - relief.v[below + right];
+				float bristle = streaks.v[above + left] - streaks.v[below + right];
+				float shade = edge_light * 0.8f + bristle * bristle_depth * float(grid);
+				size_t i = row + size_t(x);
+				paint.r.v[i] += shade;
+				paint.g.v[i] += shade;
+				paint.b.v[i] += shade;
+			}
+		}
+		write_rgb888(paint, out);
+		return int(kit::RESULT_OK);
+	});
+}
+
+} // namespace pee

@@ -1,0 +1,88 @@
+#include "look.h"
+#include "photoeditoreffects.h"
+
+namespace {
+
+/* The picture's highlights (colour weighted by how far the pixel's luma is
+ * into the light tones), averaged over factor x factor blocks: the glow
+ * source, shrunk in the same pass that picks it out. */
+void shrunk_highlights(const unsigned char *in, int width, int height, int factor, kit::Plane *small[3])
+{
+	const int sw = small[0]->width, sh = small[0]->height;
+	std::vector<float> row[3];
+	for (auto &r : row)
+		r.resize(size_t(sw));
+	for (int sy = 0; sy < sh; ++sy) {
+		for (auto &r : row)
+			std::fill(r.begin(), r.end(), 0.f);
+		const int y0 = sy * factor, y1 = std::min(y0 + factor, height);
+		for (int y = y0; y < y1; ++y) {
+			const unsigned char *px = in + size_t(y) * size_t(width) * 4;
+			for (int x = 0; x < width; ++x, px += 4) {
+				float b = px[0], g = px[1], r = px[2];
+				float keep = kit::smoothstep(110.f, 240.f, 0.299f * r + 0.587f * g + 0.114f * b);
+				const size_t s = size_t(x / factor);
+				row[0][s] += r * keep;
+				row[1][s] += g * keep;
+				row[2][s] += b * keep;
+			}
+		}
+		for (int sx = 0; sx < sw; ++sx) {
+			const float count = float(std::min(factor, width - sx * factor) * (y1 - y0));
+			for (int c = 0; c < 3; ++c)
+				small[c]->v[size_t(sy) * size_t(sw) + size_t(sx)] = row[c][size_t(sx)] / count;
+		}
+	}
+}
+
+} // namespace
+
+/* Soft glow: a diffusion filter. The picture is softened and its
+ * highlights, blurred wide, are screened back over it so that light areas
+ * bloom. `level` 0..100 is the strength (100, what the editor passes, is
+ * the full effect; 0 keeps the picture); other levels are refused. The blur
+ * widths follow the picture's size, so a thumbnail looks like the full
+ * picture. */
+int applySoftglow(const unsigned char *in, unsigned char *out, int width, int height, int level)
+{
+	if (!pee::bgra_arguments_usable(in, out, width, height) || level < 0 || level > 100)
+		return kit::RESULT_BAD_ARGUMENT;
+	return kit::guarded([&] {
+		const float strength = float(level) / 100.f;
+		const float extent = float(std::max(width, height));
+		kit::Rgb picture = kit::read_rgb(in, width, height, 4, 2, 1, 0);
+		kit::Plane *planes[3] = {&picture.r, &picture.g, &picture.b};
+
+		/* The glow is wide: worked out on a grid a few times coarser. */
+		const float glow_sigma = extent / 70.f;
+		const int factor = std::clamp(int(glow_sigma / 1.6f), 1, std::min(width, height));
+		kit::Rgb small((width + factor - 1) / factor, (height + factor - 1) / factor);
+		kit::Plane *small_planes[3] = {&small.r, &small.g, &small.b};
+		shrunk_highlights(in, width, height, factor, small_planes);
+		kit::Rgb glow(width, height);
+		kit::Plane *glow_planes[3] = {&glow.r, &glow.g, &glow.b};
+		for (int c = 0; c < 3; ++c) {
+			kit::gaussian_blur_full(*small_planes[c], glow_sigma / float(factor));
+			kit::expand_into(*small_planes[c], factor, *glow_planes[c]);
+		}
+
+		const float soften = 0.6f * strength;
+		const float bloom_gain = 1.1f * strength;
+		constexpr float INVERSE_255 = 1.f / 255.f;
+		for (int c = 0; c < 3; ++c) {
+			kit::Plane soft = *planes[c];
+			kit::gaussian_blur(soft, std::max(1.f, extent / 400.f));
+			float *o = planes[c]->v.data();
+			const float *s = soft.v.data();
+			const float *g = glow_planes[c]->v.data();
+			const size_t n = planes[c]->v.size();
+			for (size_t i = 0; i < n; ++i) {
+				float base = o[i] + (s[i] - o[i]) * soften;
+				float bloom = std::min(255.f * strength, g[i] * bloom_gain);
+				o[i] = 255.f - (255.f - base) * (255.f - bloom) * INVERSE_255;
+			}
+		}
+		kit::write_rgb(picture, out, 4, 2, 1, 0);
+		return int(kit::RESULT_OK);
+	});
+}
