@@ -68,45 +68,18 @@ TEST_F(Bars, RotateLeftThreeTimesTurnsThreeTimes)
 	EXPECT_EQ(picture_pixels(), start) << "a fourth turn restores the picture";
 }
 
-TEST_F(Bars, FunctionBarStartsWithDoneDisabled)
+TEST_F(Bars, ToolBarFollowsTheWindowRotation)
 {
-	ASSERT_NE(open_editor_on_picture(64, 48), nullptr);
-	EXPECT_STREQ(elm_object_part_text_get(vh->funcbar, "elm.text.title"), dgettext("image-editor", "IDS_ST_BODY_EDIT"));
-	EXPECT_TRUE(elm_object_disabled_get(vh->done_btn));
-	tap_tool(2);
-	EXPECT_FALSE(elm_object_disabled_get(vh->done_btn)) << "a rotation enables Done";
-}
-
-class BarsLandscape : public Bars {
-protected:
-	void SetUp() override
-	{
-		Bars::SetUp();
-		elm_win_rotation_set(win(), 90);
-	}
-};
-
-TEST_F(BarsLandscape, ToolBarIsVerticalWithLandscapeItems)
-{
-	ASSERT_NE(create_editor(), nullptr);
-	EXPECT_EQ(vh->win_rotation, 90);
-	EXPECT_FALSE(elm_gengrid_horizontal_get(vh->toolbar));
-	Evas_Coord w, h;
-	elm_gengrid_item_size_get(vh->toolbar, &w, &h);
-	EXPECT_EQ(w, 100);
-	EXPECT_EQ(h, 102);
-}
-
-TEST_F(Bars, PortraitToolBarIsHorizontalAtZeroAndHalfTurn)
-{
-	for (int rotation : {0, 180}) {
+	for (int rotation : {0, 90, 180, 270}) {
 		elm_win_rotation_set(win(), rotation);
 		ASSERT_NE(create_editor(), nullptr);
-		EXPECT_TRUE(elm_gengrid_horizontal_get(vh->toolbar));
+		bool portrait = rotation % 180 == 0;
+		EXPECT_EQ(vh->win_rotation, rotation);
+		EXPECT_EQ(elm_gengrid_horizontal_get(vh->toolbar), portrait) << rotation;
 		Evas_Coord w, h;
 		elm_gengrid_item_size_get(vh->toolbar, &w, &h);
-		EXPECT_EQ(w, 120);
-		EXPECT_EQ(h, 100);
+		EXPECT_EQ(w, portrait ? 120 : 100) << rotation;
+		EXPECT_EQ(h, portrait ? 100 : 102) << rotation;
 		destroy_editor();
 	}
 }

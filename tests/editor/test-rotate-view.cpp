@@ -22,6 +22,7 @@ TEST_F(RotateView, RightTurnReadsColumnsUpwardAndLeftTurnDownward)
 		ASSERT_EQ(right[j], src[(H - 1 - j) * W + 0]) << "first row is the first column read upward, at " << j;
 	EXPECT_TRUE(vh->edited);
 	EXPECT_TRUE(vh->rotated);
+	EXPECT_FALSE(elm_object_disabled_get(vh->done_btn));
 
 	ie_create_rotate_view(vh, 3);
 	ie_create_rotate_view(vh, 3);
