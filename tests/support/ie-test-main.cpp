@@ -115,22 +115,6 @@ void efl_errors_clear()
 
 } // namespace iet
 
-/* Sanitizer settings travel with the binaries, so a test run by hand behaves
- * as under CTest. Evas leaks a 16-byte record for every smart object it
- * constructs and Eina keeps the records of the engine modules it loaded;
- * neither is ours to fix. Leaks of the editor's own records and buffers
- * have no Evas frame and are still reported. */
-extern "C" __attribute__((visibility("default"))) const char *__asan_default_options()
-{
-	return "detect_leaks=1:fast_unwind_on_malloc=0";
-}
-
-extern "C" __attribute__((visibility("default"))) const char *__lsan_default_suppressions()
-{
-	return "leak:libevas.so.1\n"
-	       "leak:eina_module_new\n";
-}
-
 int main(int argc, char **argv)
 {
 	iet::prepare_environment();
