@@ -67,6 +67,10 @@ void Memcpy_Edit_1280x960(benchmark::State &state)
 void Editor_RotateTap_1280x960(benchmark::State &state)
 {
 	Editor_Fixture &f = editor();
+	if (!f.vh || !f.vh->main_image) {
+		state.SkipWithError("the editor could not open the picture");
+		return;
+	}
 	Evas *canvas = evas_object_evas_get(IE_get_view_object(f.vh));
 	double seconds = bench::timed_loop(state, [&] {
 		ie_create_rotate_view(f.vh, 1);
@@ -78,6 +82,10 @@ void Editor_RotateTap_1280x960(benchmark::State &state)
 void Editor_Done_1280x960(benchmark::State &state)
 {
 	Editor_Fixture &f = editor();
+	if (!f.vh || !f.vh->main_image) {
+		state.SkipWithError("the editor could not open the picture");
+		return;
+	}
 	Evas_Object *inner = ie_image_object_get(f.vh->main_image);
 	const std::string source = f.dir + "/photo.jpg";
 	double total = 0;
