@@ -8,6 +8,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <memory>
+#include <filesystem>
 #include <string>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -273,15 +274,8 @@ std::string db_path()
 
 bool make_directories(const std::string &dir)
 {
-	if (dir.empty())
-		return true;
-	struct stat st;
-	if (stat(dir.c_str(), &st) == 0)
-		return S_ISDIR(st.st_mode);
-	size_t slash = dir.find_last_of('/');
-	if (slash != std::string::npos && slash > 0 && !make_directories(dir.substr(0, slash)))
-		return false;
-	return mkdir(dir.c_str(), 0755) == 0 || errno == EEXIST;
+	std::error_code error;
+	return dir.empty() || std::filesystem::create_directories(dir, error) || std::filesystem::is_directory(dir, error);
 }
 
 int db_error(int sqlite_result)
