@@ -94,46 +94,25 @@ inline Bytes bgra_to_rgb(const Bytes &bgra)
 	return rgb;
 }
 
-inline Bytes rgb_to_bgra(const Bytes &rgb)
-{
-	Bytes bgra(rgb.size() / 3 * 4);
-	for (size_t i = 0; i < rgb.size() / 3; ++i) {
-		bgra[i * 4] = rgb[i * 3 + 2];
-		bgra[i * 4 + 1] = rgb[i * 3 + 1];
-		bgra[i * 4 + 2] = rgb[i * 3];
-		bgra[i * 4 + 3] = 255;
-	}
-	return bgra;
-}
-
-/* An engine effect (IEL_Apply_Effect) as a BGRA effect: the picture goes
- * through RGB888 records; the sketch gets the paper texture. */
+/* An engine effect as a BGRA effect: the picture goes through RGB888
+ * records, the sketch gets the paper texture, and unusable arguments reach
+ * the engine as they are, for it to refuse. */
 inline int apply_engine(int id, int32_t option, const uint8_t *in, uint8_t *out, int width, int height)
 {
-	if (!in || !out || width <= 0 || height <= 0 || int64_t(width) * height > (1 << 24)) {
-		/* Unusable arguments go through as they are, for the engine to
-		 * refuse. */
-		IEL_Image input{uint32_t(width), uint32_t(height), IEL_FORMAT_RGB888, const_cast<uint8_t *>(in)};
-		IEL_Image output{uint32_t(width), uint32_t(height), IEL_FORMAT_RGB888, out};
-		IEL_EffectParam param{};
-		param.u16EffectId = uint16_t(id);
-		param.ps32Option = &option;
-		return IEL_Apply_Effect(&input, &output, &param);
-	}
-	Bytes source(in, in + size_t(width) * size_t(height) * 4);
-	Bytes rgb_in = bgra_to_rgb(source), rgb_out(rgb_in.size(), 0);
-	Bytes texture = paper(width, height);
-	IEL_Image input{uint32_t(width), uint32_t(height), IEL_FORMAT_RGB888, rgb_in.data()};
-	IEL_Image output{uint32_t(width), uint32_t(height), IEL_FORMAT_RGB888, rgb_out.data()};
+	bool usable = in && out && width > 0 && height > 0 && int64_t(width) * height <= (1 << 24);
+	Bytes rgb_in = usable ? bgra_to_rgb(Bytes(in, in + size_t(width) * size_t(height) * 4)) : Bytes();
+	Bytes rgb_out(rgb_in.size(), 0), texture = usable ? paper(width, height) : Bytes();
+	IEL_Image input{uint32_t(width), uint32_t(height), IEL_FORMAT_RGB888, usable ? rgb_in.data() : const_cast<uint8_t *>(in)};
+	IEL_Image output{uint32_t(width), uint32_t(height), IEL_FORMAT_RGB888, usable ? rgb_out.data() : out};
 	IEL_Image paper_record{uint32_t(width), uint32_t(height), IEL_FORMAT_BGRA8888, texture.data()};
 	IEL_EffectParam param{};
 	param.u16EffectId = uint16_t(id);
 	param.ps32Option = &option;
 	param.pstTexture = id == IEL_EFFECT_ID_SKETCH ? &paper_record : nullptr;
 	int result = IEL_Apply_Effect(&input, &output, &param);
-	if (result == 0) {
-		Bytes bgra = rgb_to_bgra(rgb_out);
-		std::copy(bgra.begin(), bgra.end(), out);
+	for (size_t i = 0; result == 0 && i < rgb_out.size() / 3; ++i) {
+		out[i * 4] = rgb_out[i * 3 + 2], out[i * 4 + 1] = rgb_out[i * 3 + 1];
+		out[i * 4 + 2] = rgb_out[i * 3], out[i * 4 + 3] = 255;
 	}
 	return result;
 }

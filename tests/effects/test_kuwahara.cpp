@@ -1,5 +1,4 @@
-/* The Kuwahara filter behind cartoon and oil paint slides its window sums
- * down the picture; it must pick the same quadrants and means as the plain
+/* The fast Kuwahara filter (sliding window sums) against the plain
  * definition, borders included. */
 #include <gtest/gtest.h>
 
@@ -8,9 +7,8 @@
 
 namespace {
 
-/* The definition: each quadrant's sums over its (radius + 1)^2 pixels, the
- * border repeated; the least varied quadrant (the first on a tie, in the
- * order top-left, top-right, bottom-left, bottom-right) gives the mean. */
+/* Each quadrant's sums over its (radius + 1)^2 pixels, border repeated; the
+ * least varied quadrant (the first on a tie: TL, TR, BL, BR) gives the mean. */
 kit::Rgb plain_kuwahara(const std::vector<uint8_t> &rgb, int width, int height, int radius)
 {
 	kit::Rgb out(width, height);
