@@ -21,13 +21,28 @@ namespace {
 
 class Bars : public EditorTest {
 protected:
+	Elm_Object_Item *tool(int index)
+	{
+		Elm_Object_Item *item = elm_gengrid_first_item_get(vh->toolbar);
+		for (int i = 0; item && i < index; i++)
+			item = elm_gengrid_item_next_get(item);
+		return item;
+	}
+	/* Whether the item's theme shows it selected: its icon sits in the
+	 * item's own Edje object. */
+	bool tool_shown_selected(int index)
+	{
+		Evas_Object *icon = elm_object_item_part_content_get(tool(index), "elm.swallow.icon");
+		Evas_Object *view = icon ? evas_object_smart_parent_get(icon) : nullptr;
+		double value;
+		const char *state = view ? edje_object_part_state_get(view, "indicator", &value) : nullptr;
+		return state && !strcmp(state, "selected");
+	}
 	/* Taps the tool bar's item `index` where it is on screen. */
 	void tap_tool(int index)
 	{
 		iet::settle();
-		Elm_Object_Item *item = elm_gengrid_first_item_get(vh->toolbar);
-		for (int i = 0; item && i < index; i++)
-			item = elm_gengrid_item_next_get(item);
+		Elm_Object_Item *item = tool(index);
 		ASSERT_NE(item, nullptr);
 		Evas_Object *track = elm_object_item_track(item);
 		int x, y;
@@ -49,6 +64,7 @@ TEST_F(Bars, ToolPicksReachTheViewManager)
 	vh->edited = EINA_TRUE;
 	tap_tool(0);
 	EXPECT_EQ(ie_view_mgr_get_current_view(), IE_VIEW_TYPE_CROP);
+	EXPECT_TRUE(tool_shown_selected(0)) << "crop stays selected while its view is open";
 	EXPECT_FALSE(vh->edited) << "crop starts from a clean slate";
 	EXPECT_EQ(vh->width, win_w);
 	EXPECT_EQ(vh->height, win_h);
@@ -58,8 +74,10 @@ TEST_F(Bars, RotateLeftThreeTimesTurnsThreeTimes)
 {
 	ASSERT_NE(open_editor_on_picture(64, 48), nullptr);
 	auto start = picture_pixels();
-	for (int i = 0; i < 3; i++)
+	for (int i = 0; i < 3; i++) {
 		tap_tool(1);
+		EXPECT_FALSE(tool_shown_selected(1)) << "a rotation leaves its tool unselected, tap " << i;
+	}
 	int w, h;
 	picture_size(&w, &h);
 	EXPECT_EQ(w, 48);
