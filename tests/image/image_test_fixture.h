@@ -28,12 +28,14 @@ protected:
 	{
 		if (obj_)
 			evas_object_del(obj_);
-		obj_ = nullptr;
 		EflTest::TearDown();
 	}
 
-	Evas_Object *add_image(int x, int y, int w, int h)
+	/* Replaces any earlier object. */
+	Evas_Object *add_image(int x = 0, int y = 0, int w = 720, int h = 1280)
 	{
+		if (obj_)
+			evas_object_del(obj_);
 		obj_ = ie_image_add(win());
 		evas_object_move(obj_, x, y);
 		evas_object_resize(obj_, w, h);
@@ -56,20 +58,18 @@ protected:
 		return r;
 	}
 
-	std::string picture(const std::string &name, int w, int h)
-	{
-		if (dir_.empty())
-			dir_ = temp_dir();
-		std::string path = dir_ + "/" + name;
-		EXPECT_TRUE(write_picture(path, w, h)) << path;
-		return path;
-	}
-
 	std::string scratch_path(const std::string &name)
 	{
 		if (dir_.empty())
 			dir_ = temp_dir();
 		return dir_ + "/" + name;
+	}
+
+	std::string picture(const std::string &name, int w, int h)
+	{
+		std::string path = scratch_path(name);
+		EXPECT_TRUE(write_picture(path, w, h)) << path;
+		return path;
 	}
 
 	Evas_Object *obj_ = nullptr;
