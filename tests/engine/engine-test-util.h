@@ -1,14 +1,16 @@
-/* Pictures for the engine tests: seeded random pixels, records over them,
- * and sentinel guard bytes after the pixels so that a write past the end
- * shows. */
+/* Pictures for the engine tests: seeded random pixels, and sentinel guard
+ * bytes after them so that a write past the end shows. */
 #ifndef ENGINE_TEST_UTIL_H
 #define ENGINE_TEST_UTIL_H
 
+#include <dlog.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <cstring>
 #include <random>
+#include <string>
 #include <vector>
 
 #include "ie-engine.h"
@@ -28,23 +30,13 @@ struct Picture {
 	{
 		record = {width, height, static_cast<int16_t>(format), bytes.data()};
 	}
-	Picture(const Picture &other) : bytes(other.bytes), record(other.record), size(other.size)
-	{
-		record.pbBuf = bytes.data();
-	}
+	Picture(const Picture &o) : bytes(o.bytes), record(o.record), size(o.size) { record.pbBuf = bytes.data(); }
 	Picture &operator=(const Picture &) = delete;
 
 	uint8_t *data() { return bytes.data(); }
 	std::vector<uint8_t> pixels() const { return {bytes.begin(), bytes.begin() + size}; }
-	bool guard_intact() const
-	{
-		for (size_t i = size; i < bytes.size(); i++)
-			if (bytes[i] != kSentinel)
-				return false;
-		return true;
-	}
-	/* Neither pixels nor guard written. */
-	bool untouched() const { return pixels() == std::vector<uint8_t>(size, kSentinel) && guard_intact(); }
+	bool guard_intact() const { return std::count(bytes.begin() + size, bytes.end(), kSentinel) == kGuardBytes; }
+	bool untouched() const { return std::count(bytes.begin(), bytes.end(), kSentinel) == long(bytes.size()); }
 };
 
 inline Picture random_picture(uint32_t width, uint32_t height, uint32_t seed, int format = IEL_FORMAT_BGRA8888,
@@ -52,22 +44,28 @@ inline Picture random_picture(uint32_t width, uint32_t height, uint32_t seed, in
 {
 	Picture picture(width, height, format, bytes_per_pixel);
 	std::mt19937 rng(seed);
-	for (size_t i = 0; i < picture.size; i++)
-		picture.bytes[i] = static_cast<uint8_t>(rng());
+	std::generate_n(picture.bytes.begin(), picture.size, [&] { return static_cast<uint8_t>(rng()); });
 	return picture;
 }
 
-inline Picture filled_picture(uint32_t width, uint32_t height, uint8_t value)
+inline Picture zeroed_picture(uint32_t width, uint32_t height)
 {
 	Picture picture(width, height);
-	std::memset(picture.data(), value, picture.size);
+	std::fill_n(picture.bytes.begin(), picture.size, 0);
 	return picture;
 }
 
-/* 2^32 - 1 squared times 4 bytes cannot be addressed on any target. */
-inline IEL_Image huge_record(uint8_t *pixels)
+/* The text between the colour codes of the single logged line, which must
+ * carry the engine's tag and priority. */
+inline std::string only_message()
 {
-	return {0xffffffffu, 0xffffffffu, IEL_FORMAT_BGRA8888, pixels};
+	if (dlog_record_count() != 1)
+		return std::to_string(dlog_record_count()) + " lines";
+	EXPECT_STREQ(dlog_record_tag(0), "MARLUNE");
+	EXPECT_EQ(dlog_record_priority(0), DLOG_ERROR);
+	const std::string text = dlog_record_text(0);
+	const size_t start = text.find("\033[31m"), end = text.rfind("\033[0m");
+	return start == std::string::npos || end == std::string::npos ? text : text.substr(start + 5, end - start - 5);
 }
 
 }

@@ -2,8 +2,8 @@
  * random pictures of 1 to 40 pixels in each direction. Outputs start filled
  * with a sentinel and carry guard bytes, so unwritten or extra bytes show. */
 #include <algorithm>
+#include <array>
 #include <functional>
-#include <string>
 
 #include "engine-test-util.h"
 #include "ie-engine-private.h"
@@ -12,143 +12,111 @@ using namespace engine_test;
 
 namespace {
 
-using Fill = std::function<void(uint8_t *out)>;
+struct Input { uint32_t w, h, to_w, to_h; Picture &src, &other; }; /* to_: the output's size */
+using Fill = std::function<void(const Input &, uint8_t *out)>;
+using Size = std::pair<uint32_t, uint32_t>;
 
-void expect_same(size_t bytes, const Fill &reference, const Fill &candidate, const std::string &label)
+struct Path {
+	std::string name;
+	Fill reference, candidate;
+	uint32_t smallest_side = 1;
+	Size (*to)(uint32_t w, uint32_t h) = nullptr; /* the output's size, if not the source's */
+};
+
+void sweep(const Path &path)
 {
-	std::vector<uint8_t> want(bytes + kGuardBytes, kSentinel), got(want);
-	reference(want.data());
-	candidate(got.data());
-	ASSERT_EQ(std::count(got.begin() + bytes, got.end(), kSentinel), kGuardBytes) << label << ": wrote past the end";
-	ASSERT_TRUE(want == got) << label;
+	for (uint32_t h = path.smallest_side; h <= 40; h++)
+		for (uint32_t w = path.smallest_side; w <= 40; w++) {
+			Picture src = random_picture(w, h, w * 41 + h), other = random_picture(w, h, w * 53 + h);
+			const Size to = path.to ? path.to(w, h) : Size{w, h};
+			const Input in{w, h, to.first, to.second, src, other};
+			const size_t bytes = size_t(to.first) * to.second * 4;
+			std::vector<uint8_t> want(bytes + kGuardBytes, kSentinel), got(want);
+			path.reference(in, want.data());
+			path.candidate(in, got.data());
+			const std::string at = path.name + " " + std::to_string(w) + "x" + std::to_string(h) + " to " +
+					       std::to_string(to.first) + "x" + std::to_string(to.second);
+			ASSERT_EQ(std::count(got.begin() + bytes, got.end(), kSentinel), kGuardBytes) << at << ": wrote past the end";
+			ASSERT_TRUE(want == got) << at;
+		}
 }
 
-template <class Body>
-void for_each_size(Body body)
-{
-	for (uint32_t height = 1; height <= 40; height++)
-		for (uint32_t width = 1; width <= 40; width++)
-			body(width, height, std::to_string(width) + "x" + std::to_string(height));
-}
+uint32_t *words(uint8_t *bytes) { return reinterpret_cast<uint32_t *>(bytes); }
 
 const bool kAvx2 = __builtin_cpu_supports("avx2");
-const bool kAvx512 = __builtin_cpu_supports("avx512f");
 
 }
 
-TEST(EnginePaths, Rotation)
+TEST(EnginePaths, FastPathsMatchTheirReference)
 {
-	for_each_size([](uint32_t w, uint32_t h, const std::string &size) {
-		Picture src = random_picture(w, h, w * 41 + h);
-		const auto *words = reinterpret_cast<const uint32_t *>(src.data());
-		for (unsigned int rot : {1u, 3u}) {
-			const std::string label = size + " rotation " + std::to_string(rot);
-			const Fill reference = [&](uint8_t *out) { iel_rotate_reference(src.data(), out, w, h, 4, rot); };
-			expect_same(src.size, reference, [&](uint8_t *out) {
-				iel_rotate32_tiled(words, reinterpret_cast<uint32_t *>(out), w, h, rot);
-			}, "tiled " + label);
-			if (kAvx2)
-				expect_same(src.size, reference, [&](uint8_t *out) {
-					iel_rotate32_avx2(words, reinterpret_cast<uint32_t *>(out), w, h, rot);
-				}, "avx2 " + label);
-			expect_same(src.size, reference, [&](uint8_t *out) {
-				IEL_Image dst = {0, 0, IEL_FORMAT_BGRA8888, out};
-				ASSERT_EQ(IEL_Rotate_Image(&src.record, &dst, rot), IEL_OK);
-			}, "IEL_Rotate_Image " + label);
-		}
-	});
-}
-
-TEST(EnginePaths, Resize)
-{
-	for_each_size([](uint32_t w, uint32_t h, const std::string &size) {
-		Picture src = random_picture(w, h, w * 43 + h);
-		for (const auto &to : {std::pair<uint32_t, uint32_t>{1, 1}, {w, h}, {2 * w + 1, h / 2 + 1}, {13, 7}}) {
-			const std::string label = size + " to " + std::to_string(to.first) + "x" + std::to_string(to.second);
-			const size_t bytes = to.first * to.second * 4;
-			const Fill reference = [&](uint8_t *out) {
-				iel_resize_reference(src.data(), w, h, out, to.first, to.second);
-			};
-			if (kAvx2 && w >= 2 && h >= 2)
-				expect_same(bytes, reference, [&](uint8_t *out) {
-					iel_resize_avx2(src.data(), w, h, out, to.first, to.second);
-				}, "avx2 " + label);
-			if (kAvx512 && w >= 2 && h >= 2)
-				expect_same(bytes, reference, [&](uint8_t *out) {
-					iel_resize_avx512(src.data(), w, h, out, to.first, to.second);
-				}, "avx512 " + label);
-			expect_same(bytes, reference, [&](uint8_t *out) {
-				IEL_Image dst = {to.first, to.second, IEL_FORMAT_BGRA8888, out};
-				ASSERT_EQ(IEL_Resize_Image(&src.record, &dst), IEL_OK);
-			}, "IEL_Resize_Image " + label);
-		}
-	});
-}
-
-TEST(EnginePaths, BlendSepiaPosterize)
-{
-	if (!kAvx2)
-		GTEST_SKIP() << "no AVX2 on this processor";
-	for_each_size([](uint32_t w, uint32_t h, const std::string &size) {
-		Picture src = random_picture(w, h, w * 47 + h), other = random_picture(w, h, w * 53 + h);
+	std::vector<Path> paths;
+	for (unsigned int rot : {1u, 3u}) {
+		auto rotate = [rot](decltype(&iel_rotate32_tiled) fn) -> Fill {
+			return [rot, fn](const Input &in, uint8_t *out) { fn(words(in.src.data()), words(out), in.w, in.h, rot); };
+		};
+		const Fill reference = [rot](const Input &in, uint8_t *out) { iel_rotate_reference(in.src.data(), out, in.w, in.h, 4, rot); };
+		paths.push_back({"tiled rotation " + std::to_string(rot), reference, rotate(iel_rotate32_tiled)});
+		if (kAvx2)
+			paths.push_back({"avx2 rotation " + std::to_string(rot), reference, rotate(iel_rotate32_avx2)});
+	}
+	auto resize = [](decltype(&iel_resize_reference) fn) -> Fill {
+		return [fn](const Input &in, uint8_t *out) { fn(in.src.data(), in.w, in.h, out, in.to_w, in.to_h); };
+	};
+	for (auto to : {+[](uint32_t, uint32_t) { return Size{1, 1}; }, +[](uint32_t w, uint32_t h) { return Size{w, h}; },
+			+[](uint32_t w, uint32_t h) { return Size{2 * w + 1, h / 2 + 1}; }, +[](uint32_t, uint32_t) { return Size{13, 7}; }}) {
+		if (kAvx2)
+			paths.push_back({"avx2 resize", resize(iel_resize_reference), resize(iel_resize_avx2), 2, to});
+		if (__builtin_cpu_supports("avx512f"))
+			paths.push_back({"avx512 resize", resize(iel_resize_reference), resize(iel_resize_avx512), 2, to});
+	}
+	if (kAvx2) {
 		for (uint8_t a : {0, 1, 127, 255}) {
-			auto blend = [&](void (*fn)(const uint8_t *, uint8_t *, size_t, uint8_t)) {
-				return [&, fn](uint8_t *out) {
-					std::memcpy(out, other.data(), other.size);
-					fn(src.data(), out, src.size, a);
+			auto blend = [a](decltype(&iel_blend_reference) fn) -> Fill {
+				return [a, fn](const Input &in, uint8_t *out) {
+					std::memcpy(out, in.other.data(), in.other.size);
+					fn(in.src.data(), out, in.src.size, a);
 				};
 			};
-			expect_same(src.size, blend(iel_blend_reference), blend(iel_blend_avx2), size + " blend " + std::to_string(a));
+			paths.push_back({"blend " + std::to_string(a), blend(iel_blend_reference), blend(iel_blend_avx2)});
 		}
-		expect_same(src.size, [&](uint8_t *out) { iel_sepia_reference(src.data(), out, w * h, 4); },
-			    [&](uint8_t *out) { iel_sepia_avx2(src.data(), out, w * h); }, size + " sepia");
-		for (int strength = 0; strength <= 6; strength++) {
+		paths.push_back({"sepia", [](const Input &in, uint8_t *out) { iel_sepia_reference(in.src.data(), out, in.w * in.h, 4); },
+				 [](const Input &in, uint8_t *out) { iel_sepia_avx2(in.src.data(), out, in.w * in.h); }});
+		for (int n = 0; n <= 6; n++) {
 			uint8_t table[256];
-			iel_posterize_table(strength, table);
-			expect_same(src.size, [&](uint8_t *out) { iel_posterize_reference(src.data(), out, src.size, table); },
-				    [&](uint8_t *out) { iel_posterize_avx2(src.data(), out, src.size, strength); },
-				    size + " posterise " + std::to_string(strength));
+			iel_posterize_table(n, table);
+			const std::vector<uint8_t> map(table, table + 256);
+			paths.push_back({"posterise " + std::to_string(n),
+					 [map](const Input &in, uint8_t *out) { iel_posterize_reference(in.src.data(), out, in.src.size, map.data()); },
+					 [n](const Input &in, uint8_t *out) { iel_posterize_avx2(in.src.data(), out, in.src.size, n); }});
 		}
-	});
+		/* Level, column step, row step. */
+		for (const auto &s : std::vector<std::array<unsigned int, 3>>{{0, 1, 1}, {1, 1, 1}, {2, 1, 1}, {3, 1, 1}, {4, 1, 1},
+									       {4, 3, 2}, {1, 2, 5}, {4, 10, 10}}) {
+			/* Each path gets its own sum planes, filled with junk: a sum
+			 * read before it is written shows. */
+			auto blur = [s](decltype(&iel_blur_reference) fn) -> Fill {
+				return [s, fn](const Input &in, uint8_t *out) {
+					const unsigned int radius = iel_blur_radius(s[0]);
+					std::vector<int32_t> planes(s[2] * (in.w + 3 * radius * s[1]) * 4, 0x01234567);
+					fn(in.src.data(), out, in.w, in.h, planes.data(), radius, s[1], s[2]);
+				};
+			};
+			paths.push_back({"blur " + std::to_string(s[0]) + "," + std::to_string(s[1]) + "," + std::to_string(s[2]),
+					 blur(iel_blur_reference), blur(iel_blur_avx2)});
+		}
+	}
+	for (const Path &path : paths)
+		sweep(path);
 }
 
-/* Every blue, green and red combination once. */
+/* Every blue, green and red combination once, with varied alpha. */
 TEST(EnginePaths, SepiaEveryColour)
 {
-	if (!kAvx2)
-		GTEST_SKIP() << "no AVX2 on this processor";
-	constexpr uint32_t kColours = 1u << 24;
-	std::vector<uint8_t> src(kColours * 4);
-	for (uint32_t c = 0; c < kColours; c++) {
-		const uint32_t pixel = c | (c * 7u) << 24;
-		std::memcpy(&src[c * 4], &pixel, 4);
-	}
-	expect_same(src.size(), [&](uint8_t *out) { iel_sepia_reference(src.data(), out, kColours, 4); },
-		    [&](uint8_t *out) { iel_sepia_avx2(src.data(), out, kColours); }, "every colour");
-}
-
-TEST(EnginePaths, Blur)
-{
-	if (!kAvx2)
-		GTEST_SKIP() << "no AVX2 on this processor";
-	struct Shape { unsigned int level, column_step, row_step; };
-	const Shape shapes[] = {{0, 1, 1}, {1, 1, 1}, {2, 1, 1}, {3, 1, 1}, {4, 1, 1}, {4, 3, 2}, {1, 2, 5}, {4, 10, 10}};
-	for_each_size([&](uint32_t w, uint32_t h, const std::string &size) {
-		Picture src = random_picture(w, h, w * 59 + h);
-		for (const Shape &s : shapes) {
-			const unsigned int radius = iel_blur_radius(s.level);
-			const size_t sums = s.row_step * (w + 3 * radius * s.column_step) * 4;
-			/* Each path gets its own sum buffer, filled with junk: a
-			 * sum read before it is written shows. */
-			auto blur = [&](decltype(&iel_blur_reference) fn) {
-				return [&, fn](uint8_t *out) {
-					std::vector<int32_t> planes(sums, 0x01234567);
-					fn(src.data(), out, w, h, planes.data(), radius, s.column_step, s.row_step);
-				};
-			};
-			expect_same(src.size, blur(iel_blur_reference), blur(iel_blur_avx2),
-				    size + " level " + std::to_string(s.level) + " steps " + std::to_string(s.column_step) +
-					    "," + std::to_string(s.row_step));
-		}
-	});
+	std::vector<uint32_t> src(1u << 24), want(src.size()), got(src.size());
+	for (uint32_t c = 0; c < src.size(); c++)
+		src[c] = c | (c * 7u) << 24;
+	auto bytes = [](std::vector<uint32_t> &v) { return reinterpret_cast<uint8_t *>(v.data()); };
+	iel_sepia_reference(bytes(src), bytes(want), src.size(), 4);
+	iel_sepia_fast(bytes(src), bytes(got), src.size(), 4);
+	EXPECT_TRUE(want == got);
 }
