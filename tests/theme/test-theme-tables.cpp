@@ -9,7 +9,6 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
-#include <regex>
 #include <set>
 #include <sstream>
 #include <string>
@@ -56,13 +55,15 @@ TEST_F(ThemeTables, ColourTableAgreesWithTheThemeDefaults)
 std::set<std::string> message_ids()
 {
 	std::set<std::string> ids;
-	const std::regex id("\"(IDS_[A-Z0-9_]+)\"");
 	for (const auto &entry : std::filesystem::recursive_directory_iterator(IE_SOURCE_DIR "/editor/src")) {
 		std::stringstream text;
 		text << std::ifstream(entry.path()).rdbuf();
-		std::string s = text.str();
-		for (std::sregex_iterator m(s.begin(), s.end(), id), end; m != end; ++m)
-			ids.insert((*m)[1]);
+		const std::string s = text.str();
+		for (size_t at = s.find("\"IDS_"); at != std::string::npos; at = s.find("\"IDS_", at + 1)) {
+			size_t end = s.find('"', at + 1);
+			if (end != std::string::npos)
+				ids.insert(s.substr(at + 1, end - at - 1));
+		}
 	}
 	return ids;
 }
