@@ -1,6 +1,7 @@
 /* Quarter turns of the picture on screen. */
 #include "editor-fixture.h"
 #include "ie-image.h"
+#include "ie-save.h"
 
 namespace {
 
@@ -65,6 +66,37 @@ TEST_F(RotateView, EachTurnShowsThePictureFitted)
 	EXPECT_LE(h, ah);
 	EXPECT_NEAR(x + w / 2, ax + aw / 2, 1);
 	EXPECT_NEAR(y + h / 2, ay + ah / 2, 1);
+}
+
+} // namespace
+
+namespace {
+
+/* Pictures at the limits of what a viewer hands over: a single pixel, a
+ * one-pixel line, a strip far wider than the screen. */
+TEST_F(RotateView, ExtremeShapesRotateAndSave)
+{
+	for (auto [w, h] : {std::pair{1, 1}, std::pair{1, 7}, std::pair{10000, 10}}) {
+		ASSERT_NE(open_editor_on_picture(w, h), nullptr) << w << "x" << h;
+		ie_create_rotate_view(vh, 1);
+		iet::settle();
+		int rw, rh;
+		picture_size(&rw, &rh);
+		EXPECT_EQ(rw, h);
+		EXPECT_EQ(rh, w);
+		std::string expected = ie_save_path_get();
+		iet::tap_object(vh->done_btn);
+		ASSERT_EQ(close_requests.size(), 1u) << w << "x" << h;
+		EXPECT_EQ(close_requests[0], expected);
+		Evas_Object *check = evas_object_image_add(evas());
+		evas_object_image_file_set(check, expected.c_str(), nullptr);
+		evas_object_image_size_get(check, &rw, &rh);
+		EXPECT_EQ(rw, h);
+		EXPECT_EQ(rh, w);
+		evas_object_del(check);
+		close_requests.clear();
+		destroy_editor();
+	}
 }
 
 } // namespace
