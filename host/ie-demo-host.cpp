@@ -156,6 +156,8 @@ int main(int argc, char **argv)
 	setlocale(LC_ALL, "");
 
 	elm_init(argc, argv);
+	if (!o.shots_dir.empty())
+		ecore_file_mkpath(o.shots_dir.c_str());
 	bindtextdomain("marlune", IE_DEMO_LOCALE_DIR);
 	elm_policy_set(ELM_POLICY_QUIT, ELM_POLICY_QUIT_LAST_WINDOW_CLOSED);
 

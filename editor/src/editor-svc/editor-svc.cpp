@@ -250,11 +250,14 @@ void IE_destroy(Viewhandle *vh)
 	IE_CHECK_AS(vh, "Viewhandle");
 
 	/* Nothing deferred may run on the freed record: pending idlers go, and
-	 * an open view is closed while its objects still exist. */
+	 * an open view is closed while its objects still exist. A popup still up
+	 * goes first: deleted only with the layout, it is left registered with
+	 * the window's focus manager. */
 	ie_idlers_cancel(vh);
 	int view = ie_view_mgr_get_current_view();
 	if (view == IE_VIEW_TYPE_EFFECT || view == IE_VIEW_TYPE_CROP)
 		ie_view_mgr_set_view(IE_VIEW_TYPE_MAIN, vh);
+	_popup_close(vh);
 
 	if (vh->color_table) {
 		ea_theme_color_table_free(vh->color_table);

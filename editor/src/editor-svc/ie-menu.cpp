@@ -88,6 +88,7 @@ static Evas_Object *popup_open(Viewhandle *vh, const char *name, const char *tit
 	_popup_close(vh);
 	buttons_disabled_set(vh, EINA_TRUE);
 	Evas_Object *popup = elm_popup_add(vh->naviframe);
+	elm_object_style_set(popup, "image-editor");
 	elm_popup_align_set(popup, ELM_NOTIFY_ALIGN_FILL, 1.0);
 	evas_object_size_hint_weight_set(popup, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
 	evas_object_name_set(popup, name);

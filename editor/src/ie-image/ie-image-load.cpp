@@ -216,6 +216,7 @@ static Evas_Object *_processing_popup_create(Mainimg_Smart_Data *sd)
 		IE_LOG_E("Cannot create processing popup");
 		return NULL;
 	}
+	elm_object_style_set(popup, "image-editor");
 	elm_popup_align_set(popup, ELM_NOTIFY_ALIGN_FILL, 1.0);
 	ea_object_event_callback_add(popup, EA_CALLBACK_BACK, _processing_popup_back_cb, NULL);
 	evas_object_size_hint_weight_set(popup, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
