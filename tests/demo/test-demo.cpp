@@ -66,7 +66,7 @@ TEST_F(Demo, RotateThenDoneWritesTheRotatedPictureBesideTheSource)
 	EXPECT_EQ(row.height, 800);
 }
 
-TEST_F(Demo, CancelWithoutChangesSavesNothing)
+TEST_F(Demo, ClosingWithoutDoneSavesNothing)
 {
 	std::string dir = iet::temp_dir();
 	std::string picture = dir + "/a.png";
@@ -76,6 +76,12 @@ TEST_F(Demo, CancelWithoutChangesSavesNothing)
 	EXPECT_EQ(status, 0) << output;
 	EXPECT_NE(output.find("closed: nothing saved"), std::string::npos) << output;
 	struct stat st;
+	EXPECT_NE(stat((dir + "/a_e001.jpg").c_str(), &st), 0);
+
+	/* The host closes while the discard popup is still up. */
+	output = run_host(picture, "--do rotate-right --do cancel", &status);
+	EXPECT_EQ(status, 0) << output;
+	EXPECT_EQ(output.find("ERR<"), std::string::npos) << output;
 	EXPECT_NE(stat((dir + "/a_e001.jpg").c_str(), &st), 0);
 }
 
