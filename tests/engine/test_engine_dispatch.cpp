@@ -128,12 +128,12 @@ TEST_F(Dispatch, LibraryCodesCallTheirFunctionAndOthersAreRefused)
 	EXPECT_EQ(out.pixels(), std::vector<uint8_t>(out.size, 0));
 }
 
-/* A format-4 source is worked on in format 3; both pictures come back in
- * format 4, the source in its own byte order and the output reversed, also
- * when the code is refused. */
+/* A format-4 source is worked on in format 3 and comes back in its own byte
+ * order; the output of an effect that ran is reversed into format 4. A
+ * refused code leaves the caller's output, pixels and record, untouched. */
 TEST_F(Dispatch, Format4RoundTrip)
 {
-	Picture src = random_picture(3, 2, 4), out = zeroed_picture(3, 2), refused = zeroed_picture(3, 2);
+	Picture src = random_picture(3, 2, 4), out = zeroed_picture(3, 2);
 	src.record.eFormat = IEL_FORMAT_ARGB8888;
 	const std::vector<uint8_t> original = src.pixels();
 	ASSERT_EQ(IEL_Run_Effect(&src.record, &out.record, IE_EFFECT_NEGATIVE), IEL_OK);
@@ -141,8 +141,17 @@ TEST_F(Dispatch, Format4RoundTrip)
 	EXPECT_EQ(calls[0].input, reversed_pixels(original));
 	EXPECT_TRUE(out.pixels() == xored(original) && out.record.eFormat == IEL_FORMAT_ARGB8888);
 	EXPECT_TRUE(src.pixels() == original && src.record.eFormat == IEL_FORMAT_ARGB8888);
-	EXPECT_EQ(IEL_Run_Effect(&src.record, &refused.record, 21), IEL_ERR_INVALID_PARAM);
-	EXPECT_TRUE(src.pixels() == original && src.record.eFormat == IEL_FORMAT_ARGB8888);
+
+	for (unsigned int code : {21u, 100u, static_cast<unsigned int>(-1)}) {
+		Picture refused(3, 2);
+		const IEL_Image before = refused.record;
+		EXPECT_EQ(IEL_Run_Effect(&src.record, &refused.record, code), IEL_ERR_INVALID_PARAM) << code;
+		EXPECT_TRUE(refused.untouched()) << code;
+		EXPECT_TRUE(refused.record.u32Width == before.u32Width && refused.record.u32Height == before.u32Height &&
+			    refused.record.eFormat == before.eFormat && refused.record.pbBuf == before.pbBuf)
+			<< code;
+		EXPECT_TRUE(src.pixels() == original && src.record.eFormat == IEL_FORMAT_ARGB8888) << code;
+	}
 }
 
 TEST_F(Dispatch, OwnRoutines)

@@ -276,22 +276,23 @@ int IEL_Run_Effect(IEL_Image *src, IEL_Image *dst, unsigned int effect)
 		src->eFormat = IEL_FORMAT_BGRA8888;
 	}
 
-	int result = IEL_ERR_INVALID_PARAM;
-	if (effect <= kLargestEffect) {
+	/* An unknown code changes nothing of the caller's output: only an
+	 * effect that ran is turned back into format 4. */
+	const bool known = effect <= kLargestEffect;
+	if (known) {
 		run_known_effect(src, dst, effect);
 		dst->u32Width = src->u32Width;
 		dst->u32Height = src->u32Height;
 		dst->eFormat = IEL_FORMAT_BGRA8888;
-		result = IEL_OK;
 	}
 
 	if (converted) {
-		const size_t out_pixels = iel_byte_count(dst->u32Width, dst->u32Height, 1, &ok);
-		if (ok && iel_byte_count(dst->u32Width, dst->u32Height, 4, &ok) && ok)
-			reverse_pixel_bytes(dst->pbBuf, out_pixels);
 		reverse_pixel_bytes(src->pbBuf, pixels);
 		src->eFormat = IEL_FORMAT_ARGB8888;
-		dst->eFormat = IEL_FORMAT_ARGB8888;
+		if (known) {
+			reverse_pixel_bytes(dst->pbBuf, pixels);
+			dst->eFormat = IEL_FORMAT_ARGB8888;
+		}
 	}
-	return result;
+	return known ? IEL_OK : IEL_ERR_INVALID_PARAM;
 }
