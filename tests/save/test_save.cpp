@@ -2,10 +2,11 @@
  * storage, and writes that never replace, damage or leave behind a file. */
 #include <ie-test-harness.h>
 
-#include <dlog.h>
-#include <media_content.h>
+#include <platform_log.h>
+#include <media_db.h>
 
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
@@ -13,6 +14,8 @@
 #include <set>
 #include <sys/mount.h>
 #include <unistd.h>
+
+#include <jpeglib.h>
 
 #include "ie-save-private.h"
 #include "ie-save.h"
@@ -153,9 +156,9 @@ TEST_F(SaveTest, InternalStorageJustAboveAndBelowTheMinimum)
 	ASSERT_TRUE(mount_tmpfs(storage, "1212k"));
 	iet::log_clear();
 	EXPECT_FALSE(get_internal_memory_status(&st));
-	EXPECT_EQ(iet::log_count("Memory is almost full < 1MB", DLOG_ERROR), 1);
+	EXPECT_EQ(iet::log_count("Memory is almost full < 1MB", PLATFORM_LOG_ERROR), 1);
 	EXPECT_EQ(save(32, 32, true), "");
-	EXPECT_EQ(iet::log_count("Out of memory", DLOG_ERROR), 1);
+	EXPECT_EQ(iet::log_count("Out of memory", PLATFORM_LOG_ERROR), 1);
 	EXPECT_EQ(entries(dir), std::set<std::string>{"internal"});
 }
 
@@ -197,11 +200,47 @@ TEST_F(SaveTest, WritesAFreshJpegWithoutReplacingAnything)
 	EXPECT_EQ(read_bytes(dir + "/a_e001.jpg"), "someone else's");
 	EXPECT_FALSE(fs::exists(dir + "/nowhere"));
 
-	media_content_record_s record;
-	ASSERT_EQ(media_content_lookup(path.c_str(), &record), MEDIA_CONTENT_ERROR_NONE);
+	Media_Db_Row record;
+	ASSERT_EQ(media_db_lookup(path.c_str(), &record), MEDIA_DB_ERROR_NONE);
 	EXPECT_STREQ(record.mime_type, "image/jpeg");
 	EXPECT_EQ(record.width, 64);
 	EXPECT_EQ(record.height, 48);
+}
+
+/* The picture is written with the saver's own default quality (80): its
+ * quantisation tables are libjpeg's standard tables at that quality. */
+TEST_F(SaveTest, WritesWithTheSaversDefaultQuality)
+{
+	_save_init((dir + "/q.png").c_str());
+	std::string path = save(64, 48);
+	ASSERT_FALSE(path.empty());
+
+	FILE *file = fopen(path.c_str(), "rb");
+	ASSERT_NE(file, nullptr);
+	jpeg_decompress_struct saved;
+	jpeg_error_mgr saved_errors;
+	saved.err = jpeg_std_error(&saved_errors);
+	jpeg_create_decompress(&saved);
+	jpeg_stdio_src(&saved, file);
+	ASSERT_EQ(jpeg_read_header(&saved, TRUE), JPEG_HEADER_OK);
+
+	jpeg_compress_struct reference;
+	jpeg_error_mgr reference_errors;
+	reference.err = jpeg_std_error(&reference_errors);
+	jpeg_create_compress(&reference);
+	reference.in_color_space = JCS_RGB;
+	reference.input_components = 3;
+	jpeg_set_defaults(&reference);
+	jpeg_set_quality(&reference, 80, TRUE);
+	for (int table = 0; table < 2; table++) {
+		ASSERT_NE(saved.quant_tbl_ptrs[table], nullptr);
+		for (int i = 0; i < DCTSIZE2; i++)
+			EXPECT_EQ(saved.quant_tbl_ptrs[table]->quantval[i], reference.quant_tbl_ptrs[table]->quantval[i])
+				<< "table " << table << " entry " << i;
+	}
+	jpeg_destroy_compress(&reference);
+	jpeg_destroy_decompress(&saved);
+	fclose(file);
 }
 
 TEST_F(SaveTest, WritesNothingWhileNoNameIsPossible)
@@ -249,24 +288,24 @@ TEST_F(SaveTest, FailedWritesLeaveTheDirectoryAsItWas)
 	EXPECT_EQ(save(), "");
 	EXPECT_EQ(entries(card), std::set<std::string>{"a.png"});
 	EXPECT_EQ(read_bytes(source), source_bytes);
-	media_content_record_s record;
-	EXPECT_NE(media_content_lookup((card + "/a_e001.jpg").c_str(), &record), MEDIA_CONTENT_ERROR_NONE);
+	Media_Db_Row record;
+	EXPECT_NE(media_db_lookup((card + "/a_e001.jpg").c_str(), &record), MEDIA_DB_ERROR_NONE);
 }
 
 TEST_F(SaveTest, MediaDatabaseFailureKeepsTheFile)
 {
-	const char *db = getenv("MEDIA_CONTENT_DB");
+	const char *db = getenv("MEDIA_DB_PATH");
 	std::string saved_db = db ? db : "";
 	// A database whose directory is a plain file cannot be opened.
 	write_bytes(dir + "/not-a-dir", "");
-	setenv("MEDIA_CONTENT_DB", (dir + "/not-a-dir/media.db").c_str(), 1);
+	setenv("MEDIA_DB_PATH", (dir + "/not-a-dir/media.db").c_str(), 1);
 	_save_init((dir + "/a.png").c_str());
 	std::string path = save();
-	setenv("MEDIA_CONTENT_DB", saved_db.c_str(), 1);
+	setenv("MEDIA_DB_PATH", saved_db.c_str(), 1);
 	EXPECT_TRUE(fs::exists(path));
 	int warnings = 0;
 	for (const iet::LogLine &line : iet::log_lines())
-		warnings += line.priority == DLOG_WARN &&
+		warnings += line.priority == PLATFORM_LOG_WARN &&
 			    line.text.find("Fail to register new edited file to DB : ") != std::string::npos;
 	EXPECT_EQ(warnings, 1);
 }

@@ -19,8 +19,8 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <media_content.h>
-#include <storage.h>
+#include <media_db.h>
+#include <storage_space.h>
 
 #include "ie-debug.h"
 
@@ -34,7 +34,6 @@ constexpr size_t LONG_NAME_LEN = 240;
 constexpr size_t LONG_NAME_LIMIT = 235;
 constexpr size_t SHORT_NAME_LIMIT = 256;
 constexpr char SAVE_EXT[] = ".jpg";
-constexpr char SAVE_FLAGS[] = "quality=95";
 /* Room for the temporary name ".ie-save-XXXXXXXX.jpg" after the directory. */
 constexpr size_t TEMP_PATH_LEN = SAVE_BUF_LEN + 32;
 constexpr int TEMP_ATTEMPTS = 64;
@@ -255,7 +254,7 @@ Eina_Bool _save_image_file(Evas_Object *img)
 	if (!_save_temp_create(tmp_path, sizeof(tmp_path)))
 		return EINA_FALSE;
 	evas_object_image_alpha_set(img, EINA_TRUE);
-	bool saved = evas_object_image_save(img, tmp_path, nullptr, SAVE_FLAGS) &&
+	bool saved = evas_object_image_save(img, tmp_path, nullptr, nullptr) &&
 		     _save_flush_file(tmp_path) && _save_publish(tmp_path);
 	// After a publish the temporary name is already gone.
 	unlink(tmp_path);
@@ -323,7 +322,7 @@ char *_save_to_file(Evas_Object *img, Eina_Bool *memory_full)
 		return nullptr;
 
 	int ret = media_content_scan_file(save_path);
-	if (ret != MEDIA_CONTENT_ERROR_NONE)
+	if (ret != MEDIA_DB_ERROR_NONE)
 		IE_LOG_W("Fail to register new edited file to DB : %d", ret);
 
 	size_t len = strlen(save_path);
