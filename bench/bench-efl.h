@@ -31,7 +31,7 @@ inline Evas_Object *efl_window(int width, int height)
 		setenv("EINA_LOG_BACKTRACE", "-1", 0);
 		setenv("EINA_LOG_LEVELS", "ecore_con:0", 0);
 		setenv("ELM_PROFILE_NOSAVE", "1", 0);
-		setenv("DLOG_LEVEL", "S", 0);
+		setenv("PLATFORM_LOG_LEVEL", "S", 0);
 		elm_init(0, nullptr);
 		Evas_Object *w = elm_win_add(nullptr, "ie-bench", ELM_WIN_BASIC);
 		evas_object_resize(w, width, height);

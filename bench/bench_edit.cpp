@@ -1,7 +1,7 @@
 /* What a user waits for in the editor at 1280x960: a rotate tap (engine,
  * pixel replacement and refit) and Done (JPEG encode, flush, publish and
  * media-database registration), each against a memcpy of the picture. */
-#include <ui-gadget.h>
+#include <gadget_window.h>
 #include <unistd.h>
 
 #include <chrono>
@@ -34,7 +34,7 @@ Editor_Fixture &editor()
 			return f;
 		static std::string scratch = f.dir;
 		std::atexit([] { std::filesystem::remove_all(scratch); });
-		setenv("MEDIA_CONTENT_DB", (f.dir + "/media.db").c_str(), 1);
+		setenv("MEDIA_DB_PATH", (f.dir + "/media.db").c_str(), 1);
 		setenv("VANTRIC_LOG_DB", (f.dir + "/vantric.db").c_str(), 1);
 		setenv("STORAGE_INTERNAL_ROOT", f.dir.c_str(), 1);
 

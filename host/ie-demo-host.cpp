@@ -19,7 +19,7 @@
 #include <vector>
 
 #include <editor-svc.h>
-#include <ui-gadget.h>
+#include <gadget_window.h>
 
 #include "ie-demo-script.h"
 
@@ -89,10 +89,10 @@ bool parse(int argc, char **argv, Options *o)
 void default_platform_paths()
 {
 	static const std::string data_dir = std::string(IE_DEMO_DATA_DIR);
-	setenv("MEDIA_CONTENT_DB", (data_dir + "/media.db").c_str(), 0);
+	setenv("MEDIA_DB_PATH", (data_dir + "/media.db").c_str(), 0);
 	setenv("VANTRIC_LOG_DB", (data_dir + "/vantric-log.db").c_str(), 0);
 	setenv("STORAGE_INTERNAL_ROOT", "/", 0);
-	setenv("APP_CONTROL_LAUNCHER_DIR", (data_dir + "/launchers").c_str(), 0);
+	setenv("APP_LAUNCH_DIR", (data_dir + "/launchers").c_str(), 0);
 }
 
 void headless_environment()

@@ -18,7 +18,7 @@ struct vantric_log_manager_s {
 
 namespace {
 
-constexpr char default_db_path[] = "/opt/usr/dbspace/.vantric-log.db";
+constexpr char default_db_path[] = "/var/lib/editor-svc-platform/usage-log.db";
 constexpr int busy_timeout_ms = 5000;
 
 constexpr char schema[] =
@@ -94,7 +94,7 @@ void insert_value(const char *key, const char *value, void *data)
 
 // One entry and all its pairs, or nothing: a half-written entry would be
 // counted under the wrong feature.
-bool store_entry(sqlite3 *db, const char *uri, bundle *entry)
+bool store_entry(sqlite3 *db, const char *uri, Kv_Bundle *entry)
 {
 	if (sqlite3_exec(db, "BEGIN IMMEDIATE", nullptr, nullptr, nullptr) != SQLITE_OK)
 		return false;
@@ -112,7 +112,7 @@ bool store_entry(sqlite3 *db, const char *uri, bundle *entry)
 			sqlite3_bind_int64(insert_entry.get(), 2, static_cast<sqlite3_int64>(time(nullptr)));
 			if (sqlite3_step(insert_entry.get()) == SQLITE_DONE) {
 				InsertValues values = {insert_pair.get(), sqlite3_last_insert_rowid(db), false};
-				bundle_iterate(entry, insert_value, &values);
+				bundle_foreach(entry, insert_value, &values);
 				stored = !values.failed;
 			}
 		}
@@ -146,7 +146,7 @@ extern "C" int vantric_log_manager_create(vantric_log_manager_h *handle)
 	return VANTRIC_LOG_ERROR_NONE;
 }
 
-extern "C" int vantric_log_manager_insert(vantric_log_manager_h handle, const char *uri, bundle *entry,
+extern "C" int vantric_log_manager_insert(vantric_log_manager_h handle, const char *uri, Kv_Bundle *entry,
 					  vantric_log_reply_cb callback, void *user_data, int *request_id)
 {
 	call_count++;

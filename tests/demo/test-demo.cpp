@@ -5,7 +5,7 @@
 
 #include <cstdio>
 #include <fstream>
-#include <media_content.h>
+#include <media_db.h>
 
 #include "ie-test-harness.h"
 
@@ -60,8 +60,8 @@ TEST_F(Demo, RotateThenDoneWritesTheRotatedPictureBesideTheSource)
 	EXPECT_LT((pixels[5 * w + 5] & 0xff), 160u);
 	evas_object_del(check);
 
-	media_content_record_s row;
-	ASSERT_EQ(media_content_lookup(path.c_str(), &row), MEDIA_CONTENT_ERROR_NONE);
+	Media_Db_Row row;
+	ASSERT_EQ(media_db_lookup(path.c_str(), &row), MEDIA_DB_ERROR_NONE);
 	EXPECT_EQ(row.width, 600);
 	EXPECT_EQ(row.height, 800);
 }

@@ -118,7 +118,7 @@ TEST_F(Bars, ToolBarWithoutItemClassLeavesAWorkingEditor)
 	iet::log_clear();
 	ASSERT_NE(open_editor_on_picture(64, 48), nullptr);
 	item_class_refused = false;
-	EXPECT_EQ(iet::log_count("the toolbar item class was not created", DLOG_ERROR), 1);
+	EXPECT_EQ(iet::log_count("the toolbar item class was not created", PLATFORM_LOG_ERROR), 1);
 	EXPECT_EQ(elm_gengrid_items_count(vh->toolbar), 0u);
 	EXPECT_EQ(vh->toolbar_itc, nullptr);
 	EXPECT_EQ(ie_view_mgr_get_current_view(), IE_VIEW_TYPE_MAIN);

@@ -4,7 +4,7 @@
 #include <unistd.h>
 
 #include <fstream>
-#include <media_content.h>
+#include <media_db.h>
 
 #include "editor-fixture.h"
 #include "ie-image.h"
@@ -116,8 +116,8 @@ TEST_F(DoneCancel, DoneAfterARotationSavesBesideTheSource)
 	EXPECT_EQ(after.st_size, before.st_size);
 	EXPECT_EQ(after.st_mtim.tv_nsec, before.st_mtim.tv_nsec);
 
-	media_content_record_s row;
-	ASSERT_EQ(media_content_lookup(prepared.c_str(), &row), MEDIA_CONTENT_ERROR_NONE);
+	Media_Db_Row row;
+	ASSERT_EQ(media_db_lookup(prepared.c_str(), &row), MEDIA_DB_ERROR_NONE);
 	EXPECT_STREQ(row.mime_type, "image/jpeg");
 	EXPECT_EQ(row.width, 48);
 	EXPECT_EQ(row.height, 64);
@@ -146,7 +146,7 @@ TEST_F(DoneCancel, DoneOnAFullStorageOffersTheStorageSettings)
 	}
 	setenv("STORAGE_INTERNAL_ROOT", mount_point.c_str(), 1);
 
-	std::string launchers = getenv("APP_CONTROL_LAUNCHER_DIR");
+	std::string launchers = getenv("APP_LAUNCH_DIR");
 	std::string marker = iet::temp_dir() + "/launched";
 	mkdir(launchers.c_str(), 0755);
 	{

@@ -49,7 +49,7 @@ TEST_F(Shell, NullArgumentsLogTheTwoGuardLines)
 					    "Invalid parameter, return!", "(!(Viewhandle)) -> IE_destroy() return"}));
 	for (const auto &line : iet::log_lines()) {
 		EXPECT_EQ(line.tag, "IV-EDITOR");
-		EXPECT_EQ(line.priority, DLOG_ERROR);
+		EXPECT_EQ(line.priority, PLATFORM_LOG_ERROR);
 		EXPECT_NE(line.text.find("\033[31m"), std::string::npos) << line.text;
 	}
 

@@ -19,7 +19,7 @@ TEST_F(ViewManager, FirstTransitionLeavesTheUndefinedView)
 	ASSERT_NE(create_editor(), nullptr);
 	iet::log_clear();
 	EXPECT_TRUE(ie_view_mgr_set_view(IE_VIEW_TYPE_MAIN, vh));
-	EXPECT_EQ(iet::log_count("Current mode is undef", DLOG_INFO), 1);
+	EXPECT_EQ(iet::log_count("Current mode is undef", PLATFORM_LOG_INFO), 1);
 	EXPECT_EQ(ie_view_mgr_get_current_view(), IE_VIEW_TYPE_MAIN);
 }
 
@@ -33,7 +33,7 @@ TEST_F(ViewManager, SameViewDoesNothingButRotationsRepeat)
 	vh->effect_layout = marker;
 	iet::log_clear();
 	EXPECT_TRUE(ie_view_mgr_set_view(IE_VIEW_TYPE_MAIN, vh));
-	EXPECT_EQ(iet::log_count("Same View transition. IE_VIEW_TYPE_MAIN", DLOG_INFO), 1);
+	EXPECT_EQ(iet::log_count("Same View transition. IE_VIEW_TYPE_MAIN", PLATFORM_LOG_INFO), 1);
 	EXPECT_EQ(vh->effect_layout, marker);
 	vh->effect_layout = nullptr;
 	evas_object_del(marker);
@@ -54,7 +54,7 @@ TEST_F(ViewManager, LeavingTheEffectViewClosesItBeforeTheCropViewOpens)
 	ie_view_mgr_set_view(IE_VIEW_TYPE_EFFECT, vh);
 	iet::log_clear();
 	ie_view_mgr_set_view(IE_VIEW_TYPE_CROP, vh);
-	EXPECT_EQ(iet::log_count("ie_delete_effect_view", DLOG_INFO), 1);
+	EXPECT_EQ(iet::log_count("ie_delete_effect_view", PLATFORM_LOG_INFO), 1);
 	EXPECT_EQ(ie_view_mgr_get_current_view(), IE_VIEW_TYPE_CROP);
 	EXPECT_NE(vh->crop_layout, nullptr);
 	ie_view_mgr_set_view(IE_VIEW_TYPE_MAIN, vh);
@@ -66,12 +66,12 @@ TEST_F(ViewManager, UnknownViewsAreLoggedAndStillBecomeCurrent)
 	ASSERT_NE(create_editor(), nullptr);
 	iet::log_clear();
 	EXPECT_TRUE(ie_view_mgr_set_view(IE_VIEW_TYPE_SAVE, vh));
-	EXPECT_EQ(iet::log_count("Unhandled View : IE_VIEW_TYPE_SAVE", DLOG_ERROR), 1);
+	EXPECT_EQ(iet::log_count("Unhandled View : IE_VIEW_TYPE_SAVE", PLATFORM_LOG_ERROR), 1);
 	EXPECT_EQ(ie_view_mgr_get_current_view(), IE_VIEW_TYPE_SAVE);
 	iet::log_clear();
 	ie_view_mgr_set_view(42, vh);
-	EXPECT_EQ(iet::log_count("Unhandled View : IE_VIEW_TYPE_SAVE", DLOG_INFO), 1);
-	EXPECT_EQ(iet::log_count("Unhandled View : IE_VIEW_TYPE_UNKNOWN", DLOG_ERROR), 1);
+	EXPECT_EQ(iet::log_count("Unhandled View : IE_VIEW_TYPE_SAVE", PLATFORM_LOG_INFO), 1);
+	EXPECT_EQ(iet::log_count("Unhandled View : IE_VIEW_TYPE_UNKNOWN", PLATFORM_LOG_ERROR), 1);
 }
 
 TEST_F(ViewManager, ASecondEditorStartsFromTheLastView)
@@ -80,7 +80,7 @@ TEST_F(ViewManager, ASecondEditorStartsFromTheLastView)
 	destroy_editor();
 	iet::log_clear();
 	ASSERT_NE(open_editor_on_picture(40, 30), nullptr);
-	EXPECT_EQ(iet::log_count("Same View transition. IE_VIEW_TYPE_MAIN", DLOG_INFO), 1);
+	EXPECT_EQ(iet::log_count("Same View transition. IE_VIEW_TYPE_MAIN", PLATFORM_LOG_INFO), 1);
 }
 
 TEST_F(ViewManager, DestroyClosesAnOpenCropView)

@@ -3,7 +3,7 @@
 #ifndef ENGINE_TEST_UTIL_H
 #define ENGINE_TEST_UTIL_H
 
-#include <dlog.h>
+#include <platform_log.h>
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -59,11 +59,11 @@ inline Picture zeroed_picture(uint32_t width, uint32_t height)
  * carry the engine's tag and priority. */
 inline std::string only_message()
 {
-	if (dlog_record_count() != 1)
-		return std::to_string(dlog_record_count()) + " lines";
-	EXPECT_STREQ(dlog_record_tag(0), "MARLUNE");
-	EXPECT_EQ(dlog_record_priority(0), DLOG_ERROR);
-	const std::string text = dlog_record_text(0);
+	if (platform_log_record_count() != 1)
+		return std::to_string(platform_log_record_count()) + " lines";
+	EXPECT_STREQ(platform_log_record_tag(0), "MARLUNE");
+	EXPECT_EQ(platform_log_record_priority(0), PLATFORM_LOG_ERROR);
+	const std::string text = platform_log_record_text(0);
 	const size_t start = text.find("\033[31m"), end = text.rfind("\033[0m");
 	return start == std::string::npos || end == std::string::npos ? text : text.substr(start + 5, end - start - 5);
 }

@@ -32,7 +32,7 @@ TEST(EngineRotate, TurnsCopiesAndRefusals)
 
 	for (unsigned int rotation : {10u, static_cast<unsigned int>(-1)}) {
 		Picture refused(3, 5);
-		dlog_record_clear();
+		platform_log_record_clear();
 		EXPECT_EQ(IEL_Rotate_Image(&src, &refused.record, rotation), IEL_ERR_INVALID_PARAM);
 		EXPECT_TRUE(refused.untouched() && refused.record.u32Width == 3);
 		EXPECT_EQ(only_message(), "Unknow rot val:" + std::to_string(int(rotation)) + " \n");

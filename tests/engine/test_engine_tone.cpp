@@ -41,7 +41,7 @@ TEST(EngineBlend, EndsOfTheRangeKeepAlphaAndOthersAreRefused)
 	/* The alpha is checked before the records. */
 	struct Refused { float alpha; int shown; };
 	for (const Refused &c : {Refused{100.5f, 100}, Refused{-0.5f, 0}, Refused{NAN, 0}, Refused{1e20f, 2147483647}}) {
-		dlog_record_clear();
+		platform_log_record_clear();
 		EXPECT_EQ(IEL_Alpha_blending(nullptr, &inout.record, c.alpha), IEL_ERR_INVALID_PARAM);
 		EXPECT_EQ(only_message(), "IEL_Alpha_blending Invalid  alpha val:" + std::to_string(c.shown) + " \n");
 	}
@@ -98,7 +98,7 @@ TEST(EngineBlur, RefusalsWithTheirMessages)
 			      Case{&src.record, &info, 0, 1, IEL_ERR_INVALID_PARAM, "Invalid skip step:0,1 \n"},
 			      Case{&src.record, &info, 1, 11, IEL_ERR_INVALID_PARAM, "Invalid skip step:1,11 \n"},
 			      Case{&src.record, &sized_but_empty, 1, 1, IEL_ERR_ALLOC, "Failed to allocate ps32SumRowR \n"}}) {
-		dlog_record_clear();
+		platform_log_record_clear();
 		EXPECT_EQ(IEL_Variable_Blur_BGRA888_skip(c.src, &out.record, c.info, 4, c.column_step, c.row_step), c.result);
 		EXPECT_EQ(only_message(), c.message);
 	}

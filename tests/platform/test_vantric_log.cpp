@@ -1,4 +1,4 @@
-#include <bundle.h>
+#include <kv_bundle.h>
 #include <vantric_log_manager.h>
 #include <gtest/gtest.h>
 
@@ -26,13 +26,13 @@ protected:
 	void SetUp() override
 	{
 		iet::EflTest::SetUp();
-		setenv("VANTRIC_LOG_DB", (iet::temp_dir() + "/dbspace/.vantric-log.db").c_str(), 1);
+		setenv("VANTRIC_LOG_DB", (iet::temp_dir() + "/db/usage-log.db").c_str(), 1);
 		vantric_log_manager_fail_create(0);
 	}
 
 	int insert(vantric_log_manager_h handle, const char *feature, int *request_id = nullptr)
 	{
-		bundle *entry = bundle_create();
+		Kv_Bundle *entry = bundle_create();
 		bundle_add(entry, "app_id", "org.marlune.gallery");
 		bundle_add(entry, "feature", feature);
 		int result = vantric_log_manager_insert(handle, uri, entry, nullptr, nullptr, request_id);
@@ -46,18 +46,18 @@ protected:
 // Log entries are bundles: their pairs are the entry's columns, in order.
 TEST(Bundle, KeepsPairsInOrderAndRefusesRepeatedOrMissingValues)
 {
-	bundle *b = bundle_create();
+	Kv_Bundle *b = bundle_create();
 	ASSERT_NE(b, nullptr);
-	EXPECT_EQ(bundle_add(b, "app_id", "org.marlune.gallery"), BUNDLE_ERROR_NONE);
-	EXPECT_EQ(bundle_add_str(b, "feature", "EDIT"), BUNDLE_ERROR_NONE);
-	EXPECT_EQ(bundle_add(b, "feature", "CROP"), BUNDLE_ERROR_KEY_EXISTS);
-	EXPECT_EQ(bundle_add(b, "empty", ""), BUNDLE_ERROR_NONE);
-	EXPECT_EQ(bundle_add(b, "absent", nullptr), BUNDLE_ERROR_INVALID_PARAMETER);
-	EXPECT_EQ(bundle_get_count(b), 3);
-	EXPECT_STREQ(bundle_get_val(b, "feature"), "EDIT");
-	EXPECT_EQ(bundle_get_val(b, "missing"), nullptr);
+	EXPECT_EQ(bundle_add(b, "app_id", "org.marlune.gallery"), KV_BUNDLE_ERROR_NONE);
+	EXPECT_EQ(bundle_add_string(b, "feature", "EDIT"), KV_BUNDLE_ERROR_NONE);
+	EXPECT_EQ(bundle_add(b, "feature", "CROP"), KV_BUNDLE_ERROR_KEY_EXISTS);
+	EXPECT_EQ(bundle_add(b, "empty", ""), KV_BUNDLE_ERROR_NONE);
+	EXPECT_EQ(bundle_add(b, "absent", nullptr), KV_BUNDLE_ERROR_INVALID_PARAMETER);
+	EXPECT_EQ(bundle_size(b), 3);
+	EXPECT_STREQ(bundle_lookup(b, "feature"), "EDIT");
+	EXPECT_EQ(bundle_lookup(b, "missing"), nullptr);
 	Pairs seen;
-	bundle_iterate(b, collect, &seen);
+	bundle_foreach(b, collect, &seen);
 	EXPECT_EQ(seen, (Pairs{{"app_id", "org.marlune.gallery"}, {"feature", "EDIT"}, {"empty", ""}}));
 	bundle_free(b);
 }

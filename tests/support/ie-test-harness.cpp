@@ -1,7 +1,7 @@
 #include "ie-test-harness.h"
 
-#include <dlog.h>
-#include <ui-gadget.h>
+#include <platform_log.h>
+#include <gadget_window.h>
 
 #include <algorithm>
 #include <cstdlib>
@@ -279,14 +279,14 @@ void object_centre(Evas_Object *obj, int *x, int *y)
 std::vector<LogLine> log_lines()
 {
 	std::vector<LogLine> lines;
-	for (size_t i = 0; i < dlog_record_count(); i++)
-		lines.push_back({dlog_record_priority(i), dlog_record_tag(i), dlog_record_text(i)});
+	for (size_t i = 0; i < platform_log_record_count(); i++)
+		lines.push_back({platform_log_record_priority(i), platform_log_record_tag(i), platform_log_record_text(i)});
 	return lines;
 }
 
 void log_clear()
 {
-	dlog_record_clear();
+	platform_log_record_clear();
 }
 
 namespace {

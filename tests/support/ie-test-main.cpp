@@ -63,14 +63,14 @@ void prepare_environment()
 	setenv("EINA_LOG_BACKTRACE", "-1", 1);
 	setenv("EINA_LOG_LEVELS", "ecore_con:0", 1);
 	setenv("ELM_PROFILE_NOSAVE", "1", 1);
-	setenv("DLOG_LEVEL", "S", 0);
+	setenv("PLATFORM_LOG_LEVEL", "S", 0);
 	// gettext ignores catalogues in the C locale: run as an English user.
 	setenv("LANG", "C.UTF-8", 1);
 	setenv("LANGUAGE", "en", 1);
-	setenv("MEDIA_CONTENT_DB", (data_dir + "/media.db").c_str(), 0);
+	setenv("MEDIA_DB_PATH", (data_dir + "/media.db").c_str(), 0);
 	setenv("VANTRIC_LOG_DB", (data_dir + "/vantric-log.db").c_str(), 0);
 	setenv("STORAGE_INTERNAL_ROOT", data_dir.c_str(), 0);
-	setenv("APP_CONTROL_LAUNCHER_DIR", (data_dir + "/launchers").c_str(), 0);
+	setenv("APP_LAUNCH_DIR", (data_dir + "/launchers").c_str(), 0);
 }
 
 class ElementaryEnvironment : public ::testing::Environment {

@@ -1,7 +1,7 @@
 /* Colour and font tables and the translation catalogues, read the way the
  * editor reads them. */
 #include <Elementary.h>
-#include <efl_assist.h>
+#include <assist_theme.h>
 #include <gtest/gtest.h>
 #include <libintl.h>
 #include <locale.h>
@@ -25,11 +25,11 @@ class ThemeTables : public iet::EflTest {};
  * looks the same whether or not the table could be read. */
 TEST_F(ThemeTables, ColourTableAgreesWithTheThemeDefaults)
 {
-	Ea_Theme_Color_Table *colors = ea_theme_color_table_new(RES_DIR "image-editor-color.xml");
+	Assist_Colour_Table *colors = ea_theme_color_table_new(RES_DIR "image-editor-color.xml");
 	ASSERT_NE(nullptr, colors);
 	Evas_Object *layout = elm_layout_add(win());
 	ASSERT_TRUE(elm_layout_file_set(layout, RES_DIR "edje/image-editor.edj", "iv-editor-view"));
-	ASSERT_TRUE(ea_theme_object_colors_set(layout, colors, EA_THEME_STYLE_DARK));
+	ASSERT_TRUE(ea_theme_object_colors_set(layout, colors, ASSIST_STYLE_DARK));
 	Evas_Object *plain = edje_object_add(evas());
 	ASSERT_TRUE(edje_object_file_set(plain, RES_DIR "edje/image-editor.edj", "iv-editor-view"));
 	for (const char *code : {"AO004", "B011", "B012", "B0211"}) {
@@ -44,7 +44,7 @@ TEST_F(ThemeTables, ColourTableAgreesWithTheThemeDefaults)
 	}
 	ea_theme_color_table_free(colors);
 
-	Ea_Theme_Font_Table *fonts = ea_theme_font_table_new(RES_DIR "image-editor-font.xml");
+	Assist_Font_Table *fonts = ea_theme_font_table_new(RES_DIR "image-editor-font.xml");
 	ASSERT_NE(nullptr, fonts);
 	EXPECT_TRUE(ea_theme_object_fonts_set(layout, fonts));
 	ea_theme_font_table_free(fonts);

@@ -4,7 +4,7 @@
 #define EDITOR_SVC_PRIVATE_H
 
 #include <Elementary.h>
-#include <efl_assist.h>
+#include <assist_theme.h>
 
 #include "editor-svc.h"
 #include "ie-config.h"
@@ -15,7 +15,8 @@
 #define IE_HOST_TEXT_DOMAIN "marlune"
 
 /* One editor: the host holds it as an opaque handle. Allocated zero-filled
- * by IE_INIT, freed by IE_destroy. Fields in their documented order. */
+ * by IE_INIT, freed by IE_destroy. Every module of the editor reads and
+ * writes this one layout. */
 struct _Viewhandle {
 	Evas_Object *layout;
 	Evas_Object *transparent_layout;
@@ -56,9 +57,9 @@ struct _Viewhandle {
 	int32_t slider_touching;
 	int32_t slider_value;
 	int32_t slider_start_value;
-	Ea_Theme_Color_Table *color_table;
+	Assist_Colour_Table *color_table;
 	int32_t win_rotation;
-	Ea_Theme_Font_Table *font_table;
+	Assist_Font_Table *font_table;
 	void *log_handle;
 };
 

@@ -2,7 +2,7 @@
  * with its naviframe and bars, loading the picture, and teardown. */
 #include <libintl.h>
 
-#include <ui-gadget.h>
+#include <gadget_window.h>
 
 #include "editor-svc-private.h"
 #include "ie-idler.h"
@@ -137,12 +137,12 @@ Viewhandle *IE_create(Evas_Object *parent)
 	evas_object_name_set(vh->layout, "LyIVEDITView");
 
 	ea_theme_object_changeable_ui_enabled_set(vh->layout, EINA_TRUE);
-	ea_theme_object_style_set(vh->layout, EA_THEME_STYLE_DARK);
+	ea_theme_object_style_set(vh->layout, ASSIST_STYLE_DARK);
 
 	/* ie_changeableColorsSet */
 	vh->color_table = ea_theme_color_table_new(RES_DIR "image-editor-color.xml");
 	if (vh->color_table)
-		ea_theme_object_colors_set(vh->layout, vh->color_table, EA_THEME_STYLE_DARK);
+		ea_theme_object_colors_set(vh->layout, vh->color_table, ASSIST_STYLE_DARK);
 	else
 		IE_LOG_E("ea_theme_color_table_new failed");
 

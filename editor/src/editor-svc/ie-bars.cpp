@@ -1,6 +1,6 @@
 /* The function bar (title, Cancel, Done) and the tool bar (crop, rotate
  * left, rotate right, effects), kept in step with the window orientation. */
-#include <ui-gadget.h>
+#include <gadget_window.h>
 
 #include "editor-svc-private.h"
 #include "ie-image.h"

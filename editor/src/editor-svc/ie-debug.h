@@ -3,7 +3,7 @@
 #ifndef IE_DEBUG_H
 #define IE_DEBUG_H
 
-#include <dlog.h>
+#include <platform_log.h>
 
 #define IE_LOG_TAG "IV-EDITOR"
 
@@ -13,12 +13,12 @@
 #define IE_COLOR_RESET "\033[0m"
 
 #define IE_LOG_PRINT(prio, colour, fmt, ...) \
-	__dlog_print(LOG_ID_MAIN, prio, IE_LOG_TAG, "%s: %s(%d) > " colour fmt IE_COLOR_RESET, \
+	__dlog_print(prio, IE_LOG_TAG, "%s: %s(%d) > " colour fmt IE_COLOR_RESET, \
 		     __FILE_NAME__, __func__, __LINE__, ##__VA_ARGS__)
 
-#define IE_LOG_E(fmt, ...) IE_LOG_PRINT(DLOG_ERROR, IE_COLOR_RED, fmt, ##__VA_ARGS__)
-#define IE_LOG_W(fmt, ...) IE_LOG_PRINT(DLOG_WARN, IE_COLOR_CYAN, fmt, ##__VA_ARGS__)
-#define IE_LOG_I(fmt, ...) IE_LOG_PRINT(DLOG_INFO, IE_COLOR_GREEN, fmt, ##__VA_ARGS__)
+#define IE_LOG_E(fmt, ...) IE_LOG_PRINT(PLATFORM_LOG_ERROR, IE_COLOR_RED, fmt, ##__VA_ARGS__)
+#define IE_LOG_W(fmt, ...) IE_LOG_PRINT(PLATFORM_LOG_WARN, IE_COLOR_CYAN, fmt, ##__VA_ARGS__)
+#define IE_LOG_I(fmt, ...) IE_LOG_PRINT(PLATFORM_LOG_INFO, IE_COLOR_GREEN, fmt, ##__VA_ARGS__)
 
 /* Guards for a pointer a function cannot work without. `name` is the text
  * shown in the second line, as "!(name)". */

@@ -1,6 +1,6 @@
 /* Usage log: one entry per feature use, sent through the usage-log client.
  * Fire and forget: nothing here changes what the editor does. */
-#include <bundle.h>
+#include <kv_bundle.h>
 #include <vantric_log_manager.h>
 
 #include "editor-svc-private.h"
@@ -33,7 +33,7 @@ void _ie_log_manager_insert(Viewhandle *vh, const char *feature)
 	if (!vh->log_handle)
 		return;
 
-	bundle *entry = bundle_create();
+	Kv_Bundle *entry = bundle_create();
 	if (!entry)
 		return;
 	bundle_add(entry, "app_id", IE_HOST_PKGID);

@@ -1,7 +1,7 @@
 /* What Cancel, Done and the back key do in each view, and the editor's two
  * popups (discard changes; not enough memory). */
-#include <app_control.h>
-#include <ui-gadget.h>
+#include <app_launch.h>
+#include <gadget_window.h>
 
 #include "editor-svc-private.h"
 #include "ie-engine.h"
@@ -48,15 +48,15 @@ static void _popup_discard_cb(void *data, Evas_Object *, void *)
 
 static void launch_storage_settings(void)
 {
-	app_control_h request = NULL;
+	App_Request *request = NULL;
 	int ret = app_control_create(&request);
-	if (ret == APP_CONTROL_ERROR_NONE)
-		ret = app_control_set_operation(request, APP_CONTROL_OPERATION_VIEW);
-	if (ret == APP_CONTROL_ERROR_NONE)
+	if (ret == APP_LAUNCH_ERROR_NONE)
+		ret = app_control_set_operation(request, APP_LAUNCH_OPERATION_VIEW);
+	if (ret == APP_LAUNCH_ERROR_NONE)
 		ret = app_control_set_window(request, elm_win_xwindow_get(ug_get_window()));
-	if (ret == APP_CONTROL_ERROR_NONE)
+	if (ret == APP_LAUNCH_ERROR_NONE)
 		ret = app_control_set_app_id(request, IE_STORAGE_SETTINGS_APP_ID);
-	if (ret == APP_CONTROL_ERROR_NONE)
+	if (ret == APP_LAUNCH_ERROR_NONE)
 		app_control_send_launch_request(request, NULL, NULL);
 	if (request)
 		app_control_destroy(request);

@@ -7,14 +7,14 @@
 #include <stddef.h>
 #include <stdint.h>
 
-#include <dlog.h>
+#include <platform_log.h>
 
 #include "ie-engine.h"
 
 #define IEL_LOG_TAG "MARLUNE"
 
 #define IEL_LOG_E(fmt, ...) \
-	__dlog_print(LOG_ID_MAIN, DLOG_ERROR, IEL_LOG_TAG, "%s: %s(%d) > \033[31m" fmt "\033[0m", \
+	__dlog_print(PLATFORM_LOG_ERROR, IEL_LOG_TAG, "%s: %s(%d) > \033[31m" fmt "\033[0m", \
 		     __FILE_NAME__, __func__, __LINE__, ##__VA_ARGS__)
 
 #ifdef __cplusplus

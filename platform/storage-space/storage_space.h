@@ -1,22 +1,22 @@
 /* Storage: size of the device's storages. The internal storage is the
- * file system holding $STORAGE_INTERNAL_ROOT (default /opt/usr/media). */
-#ifndef STORAGE_H
-#define STORAGE_H
+ * file system holding $STORAGE_INTERNAL_ROOT (default /home). */
+#ifndef STORAGE_SPACE_H
+#define STORAGE_SPACE_H
 
 #include <sys/statvfs.h>
-#include <tizen_error.h>
+#include <platform_error.h>
 
 #ifdef __cplusplus
 extern "C" {
 #endif
 
 typedef enum {
-	STORAGE_ERROR_NONE = TIZEN_ERROR_NONE,
-	STORAGE_ERROR_INVALID_PARAMETER = TIZEN_ERROR_INVALID_PARAMETER,
-	STORAGE_ERROR_OUT_OF_MEMORY = TIZEN_ERROR_OUT_OF_MEMORY,
-	STORAGE_ERROR_NOT_SUPPORTED = TIZEN_ERROR_NOT_SUPPORTED,
-	STORAGE_ERROR_OPERATION_FAILED = TIZEN_ERROR_STORAGE | 0x12
-} storage_error_e;
+	STORAGE_SPACE_ERROR_NONE = PLATFORM_ERROR_NONE,
+	STORAGE_SPACE_ERROR_INVALID_PARAMETER = PLATFORM_ERROR_INVALID_PARAMETER,
+	STORAGE_SPACE_ERROR_OUT_OF_MEMORY = PLATFORM_ERROR_OUT_OF_MEMORY,
+	STORAGE_SPACE_ERROR_NOT_SUPPORTED = PLATFORM_ERROR_NOT_SUPPORTED,
+	STORAGE_SPACE_ERROR_OPERATION_FAILED = PLATFORM_ERROR_BLOCK(4) - 1
+} Storage_Space_Error;
 
 /* The internal storage root in use (the environment override or the
  * platform default). */

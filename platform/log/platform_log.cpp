@@ -1,4 +1,4 @@
-#include "dlog.h"
+#include "platform_log.h"
 
 #include <cstdio>
 #include <cstdlib>
@@ -25,17 +25,17 @@ std::deque<Line> record;
 int stderr_threshold()
 {
 	static const int threshold = [] {
-		const char *level = getenv("DLOG_LEVEL");
+		const char *level = getenv("PLATFORM_LOG_LEVEL");
 		if (!level || !*level)
-			return static_cast<int>(DLOG_WARN);
+			return static_cast<int>(PLATFORM_LOG_WARN);
 		switch (level[0]) {
-		case 'V': case 'v': return static_cast<int>(DLOG_VERBOSE);
-		case 'D': case 'd': return static_cast<int>(DLOG_DEBUG);
-		case 'I': case 'i': return static_cast<int>(DLOG_INFO);
-		case 'W': case 'w': return static_cast<int>(DLOG_WARN);
-		case 'E': case 'e': return static_cast<int>(DLOG_ERROR);
-		case 'F': case 'f': return static_cast<int>(DLOG_FATAL);
-		default: return static_cast<int>(DLOG_SILENT);
+		case 'V': case 'v': return static_cast<int>(PLATFORM_LOG_VERBOSE);
+		case 'D': case 'd': return static_cast<int>(PLATFORM_LOG_DEBUG);
+		case 'I': case 'i': return static_cast<int>(PLATFORM_LOG_INFO);
+		case 'W': case 'w': return static_cast<int>(PLATFORM_LOG_WARN);
+		case 'E': case 'e': return static_cast<int>(PLATFORM_LOG_ERROR);
+		case 'F': case 'f': return static_cast<int>(PLATFORM_LOG_FATAL);
+		default: return static_cast<int>(PLATFORM_LOG_SILENT);
 		}
 	}();
 	return threshold;
@@ -43,16 +43,16 @@ int stderr_threshold()
 
 char priority_letter(int prio)
 {
-	static constexpr char letters[] = "??VDIWEFS";
-	return (prio >= 0 && prio <= DLOG_SILENT) ? letters[prio] : '?';
+	static constexpr char letters[] = "?VDIWEFS";
+	return (prio >= 0 && prio <= PLATFORM_LOG_SILENT) ? letters[prio] : '?';
 }
 
 } // namespace
 
-extern "C" int __dlog_vprint(log_id_t log_id, int prio, const char *tag, const char *fmt, va_list ap)
+extern "C" int __dlog_vprint(int prio, const char *tag, const char *fmt, va_list ap)
 {
-	if (log_id < LOG_ID_MAIN || log_id >= LOG_ID_MAX || !fmt)
-		return DLOG_ERROR_INVALID_PARAMETER;
+	if (!fmt)
+		return PLATFORM_ERROR_INVALID_PARAMETER;
 	if (!tag)
 		tag = "";
 
@@ -61,7 +61,7 @@ extern "C" int __dlog_vprint(log_id_t log_id, int prio, const char *tag, const c
 	int length = vsnprintf(nullptr, 0, fmt, measure);
 	va_end(measure);
 	if (length < 0)
-		return DLOG_ERROR_INVALID_PARAMETER;
+		return PLATFORM_ERROR_INVALID_PARAMETER;
 	std::string text(static_cast<size_t>(length), '\0');
 	vsnprintf(text.data(), text.size() + 1, fmt, ap);
 
@@ -73,40 +73,40 @@ extern "C" int __dlog_vprint(log_id_t log_id, int prio, const char *tag, const c
 	return length;
 }
 
-extern "C" int __dlog_print(log_id_t log_id, int prio, const char *tag, const char *fmt, ...)
+extern "C" int __dlog_print(int prio, const char *tag, const char *fmt, ...)
 {
 	va_list ap;
 	va_start(ap, fmt);
-	int result = __dlog_vprint(log_id, prio, tag, fmt, ap);
+	int result = __dlog_vprint(prio, tag, fmt, ap);
 	va_end(ap);
 	return result;
 }
 
-extern "C" void dlog_record_clear(void)
+extern "C" void platform_log_record_clear(void)
 {
 	std::lock_guard<std::mutex> hold(record_lock);
 	record.clear();
 }
 
-extern "C" size_t dlog_record_count(void)
+extern "C" size_t platform_log_record_count(void)
 {
 	std::lock_guard<std::mutex> hold(record_lock);
 	return record.size();
 }
 
-extern "C" int dlog_record_priority(size_t index)
+extern "C" int platform_log_record_priority(size_t index)
 {
 	std::lock_guard<std::mutex> hold(record_lock);
-	return index < record.size() ? record[index].prio : DLOG_UNKNOWN;
+	return index < record.size() ? record[index].prio : 0;
 }
 
-extern "C" const char *dlog_record_tag(size_t index)
+extern "C" const char *platform_log_record_tag(size_t index)
 {
 	std::lock_guard<std::mutex> hold(record_lock);
 	return index < record.size() ? record[index].tag.c_str() : nullptr;
 }
 
-extern "C" const char *dlog_record_text(size_t index)
+extern "C" const char *platform_log_record_text(size_t index)
 {
 	std::lock_guard<std::mutex> hold(record_lock);
 	return index < record.size() ? record[index].text.c_str() : nullptr;

@@ -1,7 +1,7 @@
 /* UI gadget library: the window the hosted gadget lives in. The host
  * registers its window with ug_set_window() before it creates the editor. */
-#ifndef UI_GADGET_H
-#define UI_GADGET_H
+#ifndef GADGET_WINDOW_H
+#define GADGET_WINDOW_H
 
 #include <Evas.h>
 

@@ -1,4 +1,4 @@
-#include <efl_assist.h>
+#include <assist_theme.h>
 #include <gtest/gtest.h>
 
 #include <array>
@@ -66,8 +66,8 @@ TEST_F(EflAssist, TablesSetClassesItemsAndColoursFoundFromChildren)
 {
 	Evas_Object *layout = elm_layout_add(win());
 	evas_object_show(layout);
-	Ea_Theme_Color_Table *table = ea_theme_color_table_new(color_file.c_str());
-	EXPECT_TRUE(ea_theme_object_colors_set(layout, table, EA_THEME_STYLE_DARK));
+	Assist_Colour_Table *table = ea_theme_color_table_new(color_file.c_str());
+	EXPECT_TRUE(ea_theme_object_colors_set(layout, table, ASSIST_STYLE_DARK));
 	// Objects keep what was applied to them after the table is gone.
 	ea_theme_color_table_free(table);
 	Evas_Object *edje = elm_layout_edje_get(layout);
@@ -76,7 +76,7 @@ TEST_F(EflAssist, TablesSetClassesItemsAndColoursFoundFromChildren)
 	EXPECT_EQ(class_colour(edje, "B0211", 2), (Rgba{5, 6, 7, 8}));
 	EXPECT_EQ(class_colour(edje, "T0211", 1), (Rgba{0, 0, 0, 0})); // outline not given
 
-	Ea_Theme_Font_Table *fonts = ea_theme_font_table_new(font_file.c_str());
+	Assist_Font_Table *fonts = ea_theme_font_table_new(font_file.c_str());
 	EXPECT_TRUE(ea_theme_object_fonts_set(layout, fonts));
 	ea_theme_font_table_free(fonts);
 	const char *font = nullptr;

@@ -1,11 +1,11 @@
-#include "storage.h"
+#include "storage_space.h"
 
 #include <cerrno>
 #include <cstdlib>
 
 namespace {
 
-constexpr char default_internal_root[] = "/opt/usr/media";
+constexpr char default_internal_root[] = "/home";
 
 } // namespace
 
@@ -18,8 +18,8 @@ extern "C" const char *storage_get_internal_root(void)
 extern "C" int storage_get_internal_memory_size(struct statvfs *buf)
 {
 	if (!buf)
-		return STORAGE_ERROR_INVALID_PARAMETER;
+		return STORAGE_SPACE_ERROR_INVALID_PARAMETER;
 	if (statvfs(storage_get_internal_root(), buf) != 0)
-		return errno == ENOMEM ? STORAGE_ERROR_OUT_OF_MEMORY : STORAGE_ERROR_OPERATION_FAILED;
-	return STORAGE_ERROR_NONE;
+		return errno == ENOMEM ? STORAGE_SPACE_ERROR_OUT_OF_MEMORY : STORAGE_SPACE_ERROR_OPERATION_FAILED;
+	return STORAGE_SPACE_ERROR_NONE;
 }

@@ -1,4 +1,4 @@
-#include <media_content.h>
+#include <media_db.h>
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 
@@ -39,8 +39,8 @@ protected:
 	{
 		iet::EflTest::SetUp();
 		dir = iet::temp_dir();
-		db_path = dir + "/dbspace/new/.media.db";
-		setenv("MEDIA_CONTENT_DB", db_path.c_str(), 1);
+		db_path = dir + "/db/new/media.db";
+		setenv("MEDIA_DB_PATH", db_path.c_str(), 1);
 	}
 
 	// A real JPEG with an EXIF block carrying `orientation` right after the
@@ -58,9 +58,9 @@ protected:
 	void scan_and_expect_row(const std::string &path, const char *mime, int width, int height)
 	{
 		SCOPED_TRACE(path);
-		ASSERT_EQ(media_content_scan_file(path.c_str()), MEDIA_CONTENT_ERROR_NONE);
-		media_content_record_s record = {};
-		ASSERT_EQ(media_content_lookup(path.c_str(), &record), MEDIA_CONTENT_ERROR_NONE);
+		ASSERT_EQ(media_content_scan_file(path.c_str()), MEDIA_DB_ERROR_NONE);
+		Media_Db_Row record = {};
+		ASSERT_EQ(media_db_lookup(path.c_str(), &record), MEDIA_DB_ERROR_NONE);
 		struct stat st;
 		ASSERT_EQ(stat(path.c_str(), &st), 0);
 		EXPECT_STREQ(record.mime_type, mime);
@@ -83,9 +83,9 @@ TEST_F(MediaContent, ScanRecordsTypeAndShownSizeFromTheContent)
 	ASSERT_TRUE(iet::write_picture(jpg, 64, 48, "quality=90"));
 	write_file(turned, jpeg_with_orientation(64, 48, 6));
 	// Scanning works through a shared connection as well as without one.
-	ASSERT_EQ(media_content_connect(), MEDIA_CONTENT_ERROR_NONE);
+	ASSERT_EQ(media_db_open(), MEDIA_DB_ERROR_NONE);
 	scan_and_expect_row(png, "image/png", 40, 30);
-	EXPECT_EQ(media_content_disconnect(), MEDIA_CONTENT_ERROR_NONE);
+	EXPECT_EQ(media_db_close(), MEDIA_DB_ERROR_NONE);
 	scan_and_expect_row(jpg, "image/jpeg", 64, 48);
 	// Orientation 6 shows the picture a quarter turned.
 	scan_and_expect_row(turned, "image/jpeg", 48, 64);
@@ -127,10 +127,10 @@ TEST_F(MediaContent, MissingNonMediaAndTruncatedFilesAreRefused)
 	write_file(bad_wbmp, {0, 0, 0x0A, 0x02, 0xFF});
 
 	for (const std::string &path : {dir + "/missing.jpg", dir, text, empty, short_png, no_frame, bad_wbmp}) {
-		EXPECT_NE(media_content_scan_file(path.c_str()), MEDIA_CONTENT_ERROR_NONE) << path;
-		media_content_record_s record = {};
-		EXPECT_NE(media_content_lookup(path.c_str(), &record), MEDIA_CONTENT_ERROR_NONE) << path;
+		EXPECT_NE(media_content_scan_file(path.c_str()), MEDIA_DB_ERROR_NONE) << path;
+		Media_Db_Row record = {};
+		EXPECT_NE(media_db_lookup(path.c_str(), &record), MEDIA_DB_ERROR_NONE) << path;
 	}
-	EXPECT_EQ(media_content_scan_file(nullptr), MEDIA_CONTENT_ERROR_INVALID_PARAMETER);
-	EXPECT_EQ(media_content_scan_file(""), MEDIA_CONTENT_ERROR_INVALID_PARAMETER);
+	EXPECT_EQ(media_content_scan_file(nullptr), MEDIA_DB_ERROR_INVALID_PARAMETER);
+	EXPECT_EQ(media_content_scan_file(""), MEDIA_DB_ERROR_INVALID_PARAMETER);
 }

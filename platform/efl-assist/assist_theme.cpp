@@ -24,7 +24,7 @@
  * Applying a table to an object sets the Edje colour classes (text classes)
  * named after its codes on the object's Edje object, and attaches a copy
  * of the table to the object for ea_theme_object_color_get. */
-#include "efl_assist.h"
+#include "assist_theme.h"
 
 // This header has no C++ guard of its own; its weak declaration would
 // otherwise bind to a mangled name that never resolves.
@@ -67,11 +67,11 @@ using FontMap = std::map<std::string, FontEntry>;
 
 // Objects keep a shared reference to the entries, so freeing a table while
 // objects it was applied to live on is safe.
-struct _Ea_Theme_Color_Table {
+struct _Assist_Colour_Table {
 	std::shared_ptr<const ColorMap> colors;
 };
 
-struct _Ea_Theme_Font_Table {
+struct _Assist_Font_Table {
 	std::shared_ptr<const FontMap> fonts;
 };
 
@@ -262,7 +262,7 @@ struct ObjectTheme {
 	std::shared_ptr<const ColorMap> colors;
 	std::shared_ptr<const FontMap> fonts;
 	bool changeable = false;
-	Ea_Theme_Style style = EA_THEME_STYLE_DEFAULT;
+	Assist_Style style = ASSIST_STYLE_DEFAULT;
 };
 
 const ObjectTheme *object_theme_find(const Evas_Object *obj)
@@ -321,9 +321,9 @@ const ColorMap *nearest_colors(const Evas_Object *obj)
 	return nullptr;
 }
 
-bool valid_style(Ea_Theme_Style style)
+bool valid_style(Assist_Style style)
 {
-	return style == EA_THEME_STYLE_DEFAULT || style == EA_THEME_STYLE_LIGHT || style == EA_THEME_STYLE_DARK;
+	return style == ASSIST_STYLE_DEFAULT || style == ASSIST_STYLE_LIGHT || style == ASSIST_STYLE_DARK;
 }
 
 /* ---- Hardware keys --------------------------------------------------- */
@@ -331,8 +331,8 @@ bool valid_style(Ea_Theme_Style style)
 struct KeyRegistration {
 	Evas_Object *obj;
 	Evas_Object *win;
-	Ea_Callback_Type type;
-	Ea_Event_Cb func;
+	Assist_Key type;
+	Assist_Key_Cb func;
 	void *data;
 };
 
@@ -437,7 +437,7 @@ void on_window_key_down(void *, Evas *, Evas_Object *win, void *event_info)
 	auto *event = static_cast<Evas_Event_Key_Down *>(event_info);
 	if (!event || (event->event_flags & EVAS_EVENT_FLAG_ON_HOLD))
 		return;
-	Ea_Callback_Type type;
+	Assist_Key type;
 	if (key_is(event->keyname, back_keys))
 		type = EA_CALLBACK_BACK;
 	else if (key_is(event->keyname, more_keys))
@@ -451,7 +451,7 @@ void on_window_key_down(void *, Evas *, Evas_Object *win, void *event_info)
 			continue;
 		// Copied first: the callback may add or remove registrations,
 		// including this one.
-		Ea_Event_Cb func = registration->func;
+		Assist_Key_Cb func = registration->func;
 		void *data = registration->data;
 		Evas_Object *obj = registration->obj;
 		event->event_flags = static_cast<Evas_Event_Flags>(event->event_flags | EVAS_EVENT_FLAG_ON_HOLD);
@@ -464,8 +464,8 @@ void on_window_key_down(void *, Evas *, Evas_Object *win, void *event_info)
 
 struct ThemeCallback {
 	unsigned long serial;
-	Ea_Theme_Callback_Type type;
-	Ea_Theme_Event_Cb func;
+	Assist_Theme_Event type;
+	Assist_Theme_Cb func;
 	void *data;
 };
 
@@ -476,32 +476,32 @@ unsigned long theme_callback_serial;
 
 /* ---- Exported: tables ------------------------------------------------ */
 
-extern "C" Ea_Theme_Color_Table *ea_theme_color_table_new(const char *file)
+extern "C" Assist_Colour_Table *ea_theme_color_table_new(const char *file)
 {
 	ParseState state;
 	if (!parse_table(file, "ColorTable", &state))
 		return nullptr;
-	auto *table = new _Ea_Theme_Color_Table();
+	auto *table = new _Assist_Colour_Table();
 	table->colors = std::make_shared<const ColorMap>(std::move(state.colors));
 	return table;
 }
 
-extern "C" void ea_theme_color_table_free(Ea_Theme_Color_Table *table)
+extern "C" void ea_theme_color_table_free(Assist_Colour_Table *table)
 {
 	delete table;
 }
 
-extern "C" Ea_Theme_Font_Table *ea_theme_font_table_new(const char *file)
+extern "C" Assist_Font_Table *ea_theme_font_table_new(const char *file)
 {
 	ParseState state;
 	if (!parse_table(file, "FontTable", &state))
 		return nullptr;
-	auto *table = new _Ea_Theme_Font_Table();
+	auto *table = new _Assist_Font_Table();
 	table->fonts = std::make_shared<const FontMap>(std::move(state.fonts));
 	return table;
 }
 
-extern "C" void ea_theme_font_table_free(Ea_Theme_Font_Table *table)
+extern "C" void ea_theme_font_table_free(Assist_Font_Table *table)
 {
 	delete table;
 }
@@ -520,7 +520,7 @@ extern "C" Eina_Bool ea_theme_object_changeable_ui_enabled_get(const Evas_Object
 	return theme && theme->changeable;
 }
 
-extern "C" Eina_Bool ea_theme_object_style_set(Evas_Object *obj, Ea_Theme_Style style)
+extern "C" Eina_Bool ea_theme_object_style_set(Evas_Object *obj, Assist_Style style)
 {
 	if (!obj || !valid_style(style))
 		return EINA_FALSE;
@@ -528,13 +528,13 @@ extern "C" Eina_Bool ea_theme_object_style_set(Evas_Object *obj, Ea_Theme_Style 
 	return EINA_TRUE;
 }
 
-extern "C" Ea_Theme_Style ea_theme_object_style_get(const Evas_Object *obj)
+extern "C" Assist_Style ea_theme_object_style_get(const Evas_Object *obj)
 {
 	const ObjectTheme *theme = obj ? object_theme_find(obj) : nullptr;
-	return theme ? theme->style : EA_THEME_STYLE_DEFAULT;
+	return theme ? theme->style : ASSIST_STYLE_DEFAULT;
 }
 
-extern "C" Eina_Bool ea_theme_object_colors_set(Evas_Object *obj, Ea_Theme_Color_Table *table, Ea_Theme_Style style)
+extern "C" Eina_Bool ea_theme_object_colors_set(Evas_Object *obj, Assist_Colour_Table *table, Assist_Style style)
 {
 	if (!obj || !table || !valid_style(style))
 		return EINA_FALSE;
@@ -550,7 +550,7 @@ extern "C" Eina_Bool ea_theme_object_colors_set(Evas_Object *obj, Ea_Theme_Color
 	return EINA_TRUE;
 }
 
-extern "C" Eina_Bool ea_theme_object_fonts_set(Evas_Object *obj, Ea_Theme_Font_Table *table)
+extern "C" Eina_Bool ea_theme_object_fonts_set(Evas_Object *obj, Assist_Font_Table *table)
 {
 	if (!obj || !table)
 		return EINA_FALSE;
@@ -616,9 +616,9 @@ extern "C" Eina_Bool ea_theme_object_item_color_replace(Elm_Object_Item *item, c
 
 /* ---- Exported: hardware keys ----------------------------------------- */
 
-extern "C" void ea_object_event_callback_add(Evas_Object *obj, Ea_Callback_Type type, Ea_Event_Cb func, void *data)
+extern "C" void ea_object_event_callback_add(Evas_Object *obj, Assist_Key type, Assist_Key_Cb func, void *data)
 {
-	if (!obj || !func || type < EA_CALLBACK_BACK || type >= EA_CALLBACK_LAST)
+	if (!obj || !func || type < EA_CALLBACK_BACK || type >= ASSIST_KEY_COUNT)
 		return;
 	auto *registration = new KeyRegistration{obj, elm_win_get(obj), type, func, data};
 	key_registrations.push_back(registration);
@@ -627,7 +627,7 @@ extern "C" void ea_object_event_callback_add(Evas_Object *obj, Ea_Callback_Type 
 		window_attach(registration->win);
 }
 
-extern "C" void *ea_object_event_callback_del(Evas_Object *obj, Ea_Callback_Type type, Ea_Event_Cb func)
+extern "C" void *ea_object_event_callback_del(Evas_Object *obj, Assist_Key type, Assist_Key_Cb func)
 {
 	for (auto it = key_registrations.rbegin(); it != key_registrations.rend(); ++it) {
 		KeyRegistration *registration = *it;
@@ -642,14 +642,14 @@ extern "C" void *ea_object_event_callback_del(Evas_Object *obj, Ea_Callback_Type
 
 /* ---- Exported: theme change callbacks -------------------------------- */
 
-extern "C" void ea_theme_event_callback_add(Ea_Theme_Callback_Type type, Ea_Theme_Event_Cb func, void *data)
+extern "C" void ea_theme_event_callback_add(Assist_Theme_Event type, Assist_Theme_Cb func, void *data)
 {
 	if (!func)
 		return;
 	theme_callbacks.push_back({++theme_callback_serial, type, func, data});
 }
 
-extern "C" void *ea_theme_event_callback_del(Ea_Theme_Callback_Type type, Ea_Theme_Event_Cb func)
+extern "C" void *ea_theme_event_callback_del(Assist_Theme_Event type, Assist_Theme_Cb func)
 {
 	auto it = std::find_if(theme_callbacks.begin(), theme_callbacks.end(),
 			       [&](const ThemeCallback &c) { return c.type == type && c.func == func; });
@@ -660,7 +660,7 @@ extern "C" void *ea_theme_event_callback_del(Ea_Theme_Callback_Type type, Ea_The
 	return data;
 }
 
-extern "C" void ea_theme_changed_notify(Ea_Theme_Callback_Type type)
+extern "C" void ea_theme_changed_notify(Assist_Theme_Event type)
 {
 	// Callbacks may remove themselves or others while we go: work on a
 	// snapshot and skip any that are gone by the time their turn comes.

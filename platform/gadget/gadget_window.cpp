@@ -1,4 +1,4 @@
-#include "ui-gadget.h"
+#include "gadget_window.h"
 
 namespace {
 

@@ -1,4 +1,4 @@
-#include "app_control.h"
+#include "app_launch.h"
 
 #include <cerrno>
 #include <cstdlib>
@@ -15,7 +15,7 @@
 
 extern char **environ;
 
-struct app_control_s {
+struct App_Request {
 	std::string operation;
 	std::string app_id;
 	unsigned int window = 0;
@@ -47,7 +47,7 @@ void reap_finished_launchers()
 
 std::string launcher_dir()
 {
-	const char *dir = getenv("APP_CONTROL_LAUNCHER_DIR");
+	const char *dir = getenv("APP_LAUNCH_DIR");
 	return (dir && *dir) ? dir : default_launcher_dir;
 }
 
@@ -75,99 +75,99 @@ bool is_executable_file(const std::string &path)
 int copy_out(const std::string &value, char **out)
 {
 	if (!out)
-		return APP_CONTROL_ERROR_INVALID_PARAMETER;
+		return APP_LAUNCH_ERROR_INVALID_PARAMETER;
 	if (value.empty()) {
 		*out = nullptr;
-		return APP_CONTROL_ERROR_NONE;
+		return APP_LAUNCH_ERROR_NONE;
 	}
 	*out = strdup(value.c_str());
-	return *out ? APP_CONTROL_ERROR_NONE : APP_CONTROL_ERROR_OUT_OF_MEMORY;
+	return *out ? APP_LAUNCH_ERROR_NONE : APP_LAUNCH_ERROR_OUT_OF_MEMORY;
 }
 
 } // namespace
 
-extern "C" int app_control_create(app_control_h *app_control)
+extern "C" int app_control_create(App_Request **app_control)
 {
 	if (!app_control)
-		return APP_CONTROL_ERROR_INVALID_PARAMETER;
-	*app_control = new (std::nothrow) app_control_s();
-	return *app_control ? APP_CONTROL_ERROR_NONE : APP_CONTROL_ERROR_OUT_OF_MEMORY;
+		return APP_LAUNCH_ERROR_INVALID_PARAMETER;
+	*app_control = new (std::nothrow) App_Request();
+	return *app_control ? APP_LAUNCH_ERROR_NONE : APP_LAUNCH_ERROR_OUT_OF_MEMORY;
 }
 
-extern "C" int app_control_destroy(app_control_h app_control)
+extern "C" int app_control_destroy(App_Request *app_control)
 {
 	if (!app_control)
-		return APP_CONTROL_ERROR_INVALID_PARAMETER;
+		return APP_LAUNCH_ERROR_INVALID_PARAMETER;
 	delete app_control;
-	return APP_CONTROL_ERROR_NONE;
+	return APP_LAUNCH_ERROR_NONE;
 }
 
-extern "C" int app_control_set_operation(app_control_h app_control, const char *operation)
+extern "C" int app_control_set_operation(App_Request *app_control, const char *operation)
 {
 	if (!app_control)
-		return APP_CONTROL_ERROR_INVALID_PARAMETER;
+		return APP_LAUNCH_ERROR_INVALID_PARAMETER;
 	app_control->operation = operation ? operation : "";
-	return APP_CONTROL_ERROR_NONE;
+	return APP_LAUNCH_ERROR_NONE;
 }
 
-extern "C" int app_control_get_operation(app_control_h app_control, char **operation)
+extern "C" int app_control_operation_get(App_Request *app_control, char **operation)
 {
 	if (!app_control)
-		return APP_CONTROL_ERROR_INVALID_PARAMETER;
+		return APP_LAUNCH_ERROR_INVALID_PARAMETER;
 	return copy_out(app_control->operation, operation);
 }
 
-extern "C" int app_control_set_app_id(app_control_h app_control, const char *app_id)
+extern "C" int app_control_set_app_id(App_Request *app_control, const char *app_id)
 {
 	if (!app_control)
-		return APP_CONTROL_ERROR_INVALID_PARAMETER;
+		return APP_LAUNCH_ERROR_INVALID_PARAMETER;
 	app_control->app_id = app_id ? app_id : "";
-	return APP_CONTROL_ERROR_NONE;
+	return APP_LAUNCH_ERROR_NONE;
 }
 
-extern "C" int app_control_get_app_id(app_control_h app_control, char **app_id)
+extern "C" int app_control_app_id_get(App_Request *app_control, char **app_id)
 {
 	if (!app_control)
-		return APP_CONTROL_ERROR_INVALID_PARAMETER;
+		return APP_LAUNCH_ERROR_INVALID_PARAMETER;
 	return copy_out(app_control->app_id, app_id);
 }
 
-extern "C" int app_control_set_window(app_control_h app_control, unsigned int id)
+extern "C" int app_control_set_window(App_Request *app_control, unsigned int id)
 {
 	if (!app_control)
-		return APP_CONTROL_ERROR_INVALID_PARAMETER;
+		return APP_LAUNCH_ERROR_INVALID_PARAMETER;
 	app_control->window = id;
-	return APP_CONTROL_ERROR_NONE;
+	return APP_LAUNCH_ERROR_NONE;
 }
 
-extern "C" int app_control_add_extra_data(app_control_h app_control, const char *key, const char *value)
+extern "C" int app_control_extra_add(App_Request *app_control, const char *key, const char *value)
 {
 	if (!app_control || !key || !*key || !value)
-		return APP_CONTROL_ERROR_INVALID_PARAMETER;
+		return APP_LAUNCH_ERROR_INVALID_PARAMETER;
 	// A key given again takes the new value instead of being sent twice.
 	for (auto &pair : app_control->extra_data) {
 		if (pair.first == key) {
 			pair.second = value;
-			return APP_CONTROL_ERROR_NONE;
+			return APP_LAUNCH_ERROR_NONE;
 		}
 	}
 	app_control->extra_data.emplace_back(key, value);
-	return APP_CONTROL_ERROR_NONE;
+	return APP_LAUNCH_ERROR_NONE;
 }
 
-extern "C" int app_control_send_launch_request(app_control_h app_control,
-					       app_control_reply_cb, void *)
+extern "C" int app_control_send_launch_request(App_Request *app_control,
+					       App_Launch_Reply_Cb, void *)
 {
 	if (!app_control || app_control->operation.empty() || app_control->app_id.empty())
-		return APP_CONTROL_ERROR_INVALID_PARAMETER;
+		return APP_LAUNCH_ERROR_INVALID_PARAMETER;
 	if (!app_id_is_safe(app_control->app_id))
-		return APP_CONTROL_ERROR_INVALID_PARAMETER;
+		return APP_LAUNCH_ERROR_INVALID_PARAMETER;
 
 	reap_finished_launchers();
 
 	std::string launcher = launcher_dir() + "/" + app_control->app_id;
 	if (!is_executable_file(launcher))
-		return APP_CONTROL_ERROR_APP_NOT_FOUND;
+		return APP_LAUNCH_ERROR_APP_NOT_FOUND;
 
 	std::vector<std::string> args = {launcher, "--operation", app_control->operation,
 					 "--window", std::to_string(app_control->window)};
@@ -182,8 +182,8 @@ extern "C" int app_control_send_launch_request(app_control_h app_control,
 
 	pid_t pid;
 	if (posix_spawn(&pid, launcher.c_str(), nullptr, nullptr, argv.data(), environ) != 0)
-		return APP_CONTROL_ERROR_LAUNCH_FAILED;
+		return APP_LAUNCH_ERROR_LAUNCH_FAILED;
 	std::lock_guard<std::mutex> hold(launched_lock);
 	launched.push_back(pid);
-	return APP_CONTROL_ERROR_NONE;
+	return APP_LAUNCH_ERROR_NONE;
 }

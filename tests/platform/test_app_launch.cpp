@@ -1,4 +1,4 @@
-#include <app_control.h>
+#include <app_launch.h>
 #include <gtest/gtest.h>
 
 #include <chrono>
@@ -36,8 +36,8 @@ protected:
 		iet::EflTest::SetUp();
 		launchers = iet::temp_dir();
 		output = iet::temp_dir() + "/args";
-		setenv("APP_CONTROL_LAUNCHER_DIR", launchers.c_str(), 1);
-		ASSERT_EQ(app_control_create(&handle), APP_CONTROL_ERROR_NONE);
+		setenv("APP_LAUNCH_DIR", launchers.c_str(), 1);
+		ASSERT_EQ(app_control_create(&handle), APP_LAUNCH_ERROR_NONE);
 	}
 	void TearDown() override
 	{
@@ -61,7 +61,7 @@ protected:
 	}
 
 	std::string launchers, output;
-	app_control_h handle = nullptr;
+	App_Request *handle = nullptr;
 };
 
 } // namespace
@@ -69,23 +69,23 @@ protected:
 TEST_F(AppControl, LaunchRunsTheRegisteredLauncherWithTheRequestAndReapsIt)
 {
 	install_launcher("setting-storage-efl");
-	app_control_set_operation(handle, APP_CONTROL_OPERATION_VIEW);
+	app_control_set_operation(handle, APP_LAUNCH_OPERATION_VIEW);
 	app_control_set_window(handle, 4242);
-	app_control_add_extra_data(handle, "path", "/opt/usr/media/a b.jpg");
-	app_control_add_extra_data(handle, "mode", "old");
-	app_control_add_extra_data(handle, "mode", "new");
-	EXPECT_EQ(launch("setting-storage-efl"), APP_CONTROL_ERROR_NONE);
+	app_control_extra_add(handle, "path", "/home/pictures/a b.jpg");
+	app_control_extra_add(handle, "mode", "old");
+	app_control_extra_add(handle, "mode", "new");
+	EXPECT_EQ(launch("setting-storage-efl"), APP_LAUNCH_ERROR_NONE);
 	wait_until([&] { return access(output.c_str(), F_OK) == 0; });
 	std::stringstream text;
 	text << std::ifstream(output).rdbuf();
-	EXPECT_EQ(text.str(), "--operation\n" APP_CONTROL_OPERATION_VIEW "\n--window\n4242\n"
-			      "--data\npath=/opt/usr/media/a b.jpg\n--data\nmode=new\n");
+	EXPECT_EQ(text.str(), "--operation\n" APP_LAUNCH_OPERATION_VIEW "\n--window\n4242\n"
+			      "--data\npath=/home/pictures/a b.jpg\n--data\nmode=new\n");
 
 	// The finished launcher is collected by the next request, so that it
 	// does not stay behind as a zombie.
 	wait_until(zombie_child);
 	ASSERT_TRUE(zombie_child());
-	EXPECT_EQ(launch("unknown"), APP_CONTROL_ERROR_APP_NOT_FOUND);
+	EXPECT_EQ(launch("unknown"), APP_LAUNCH_ERROR_APP_NOT_FOUND);
 	EXPECT_FALSE(zombie_child());
 }
 
@@ -93,14 +93,14 @@ TEST_F(AppControl, RefusesUnknownUnsafeAndIncompleteRequests)
 {
 	install_launcher("not-executable", 0644);
 	install_launcher("escaped");
-	app_control_set_operation(handle, APP_CONTROL_OPERATION_VIEW);
-	EXPECT_EQ(app_control_send_launch_request(handle, nullptr, nullptr), APP_CONTROL_ERROR_INVALID_PARAMETER);
-	EXPECT_EQ(launch("setting-storage-efl"), APP_CONTROL_ERROR_APP_NOT_FOUND);
-	EXPECT_EQ(launch("not-executable"), APP_CONTROL_ERROR_APP_NOT_FOUND);
+	app_control_set_operation(handle, APP_LAUNCH_OPERATION_VIEW);
+	EXPECT_EQ(app_control_send_launch_request(handle, nullptr, nullptr), APP_LAUNCH_ERROR_INVALID_PARAMETER);
+	EXPECT_EQ(launch("setting-storage-efl"), APP_LAUNCH_ERROR_APP_NOT_FOUND);
+	EXPECT_EQ(launch("not-executable"), APP_LAUNCH_ERROR_APP_NOT_FOUND);
 	// An app id must not reach outside the launcher directory.
 	EXPECT_EQ(launch(("../" + launchers.substr(launchers.rfind('/') + 1) + "/escaped").c_str()),
-		  APP_CONTROL_ERROR_INVALID_PARAMETER);
+		  APP_LAUNCH_ERROR_INVALID_PARAMETER);
 	app_control_set_operation(handle, nullptr);
-	EXPECT_EQ(launch("escaped"), APP_CONTROL_ERROR_INVALID_PARAMETER);
+	EXPECT_EQ(launch("escaped"), APP_LAUNCH_ERROR_INVALID_PARAMETER);
 	EXPECT_EQ(access(output.c_str(), F_OK), -1);
 }

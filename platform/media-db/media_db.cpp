@@ -1,4 +1,4 @@
-#include "media_content.h"
+#include "media_db.h"
 
 #include <sqlite3.h>
 
@@ -15,7 +15,7 @@
 
 namespace {
 
-constexpr char default_db_path[] = "/opt/usr/dbspace/.media.db";
+constexpr char default_db_path[] = "/var/lib/editor-svc-platform/media.db";
 constexpr int busy_timeout_ms = 5000;
 
 constexpr char schema[] =
@@ -261,14 +261,14 @@ struct StmtFinalizer {
 };
 using Stmt = std::unique_ptr<sqlite3_stmt, StmtFinalizer>;
 
-// The connection opened by media_content_connect, shared until the last
+// The connection opened by media_db_open, shared until the last
 // disconnect; calls made without one open a connection of their own.
 Db shared_db;
 int connect_count;
 
 std::string db_path()
 {
-	const char *path = getenv("MEDIA_CONTENT_DB");
+	const char *path = getenv("MEDIA_DB_PATH");
 	return (path && *path) ? path : default_db_path;
 }
 
@@ -282,14 +282,14 @@ int db_error(int sqlite_result)
 {
 	int primary = sqlite_result & 0xFF;
 	if (primary == SQLITE_BUSY || primary == SQLITE_LOCKED)
-		return MEDIA_CONTENT_ERROR_DB_BUSY;
+		return MEDIA_DB_ERROR_DB_BUSY;
 	if (primary == SQLITE_FULL)
-		return MEDIA_CONTENT_FILE_NO_SPACE_ON_DEVICE;
+		return MEDIA_DB_ERROR_NO_SPACE;
 	if (primary == SQLITE_NOMEM)
-		return MEDIA_CONTENT_ERROR_OUT_OF_MEMORY;
+		return MEDIA_DB_ERROR_OUT_OF_MEMORY;
 	if (primary == SQLITE_PERM || primary == SQLITE_READONLY)
-		return MEDIA_CONTENT_ERROR_PERMISSION_DENIED;
-	return MEDIA_CONTENT_ERROR_DB_FAILED;
+		return MEDIA_DB_ERROR_PERMISSION_DENIED;
+	return MEDIA_DB_ERROR_DB_FAILED;
 }
 
 int open_db(Db *out)
@@ -297,7 +297,7 @@ int open_db(Db *out)
 	std::string path = db_path();
 	size_t slash = path.find_last_of('/');
 	if (slash != std::string::npos && !make_directories(path.substr(0, slash)))
-		return MEDIA_CONTENT_ERROR_DB_FAILED;
+		return MEDIA_DB_ERROR_DB_FAILED;
 	sqlite3 *raw = nullptr;
 	int rc = sqlite3_open_v2(path.c_str(), &raw, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, nullptr);
 	Db db(raw);
@@ -310,7 +310,7 @@ int open_db(Db *out)
 	if (rc != SQLITE_OK)
 		return db_error(rc);
 	*out = std::move(db);
-	return MEDIA_CONTENT_ERROR_NONE;
+	return MEDIA_DB_ERROR_NONE;
 }
 
 // The shared connection when connected, else `local` freshly opened.
@@ -318,7 +318,7 @@ int use_db(Db *local, sqlite3 **db)
 {
 	if (shared_db) {
 		*db = shared_db.get();
-		return MEDIA_CONTENT_ERROR_NONE;
+		return MEDIA_DB_ERROR_NONE;
 	}
 	int result = open_db(local);
 	*db = local->get();
@@ -344,47 +344,47 @@ bool absolute_path(const char *path, std::string *out)
 
 } // namespace
 
-extern "C" int media_content_connect(void)
+extern "C" int media_db_open(void)
 {
 	if (connect_count == 0) {
 		int result = open_db(&shared_db);
-		if (result != MEDIA_CONTENT_ERROR_NONE)
+		if (result != MEDIA_DB_ERROR_NONE)
 			return result;
 	}
 	connect_count++;
-	return MEDIA_CONTENT_ERROR_NONE;
+	return MEDIA_DB_ERROR_NONE;
 }
 
-extern "C" int media_content_disconnect(void)
+extern "C" int media_db_close(void)
 {
 	if (connect_count == 0)
-		return MEDIA_CONTENT_ERROR_INVALID_OPERATION;
+		return MEDIA_DB_ERROR_INVALID_OPERATION;
 	if (--connect_count == 0)
 		shared_db.reset();
-	return MEDIA_CONTENT_ERROR_NONE;
+	return MEDIA_DB_ERROR_NONE;
 }
 
 extern "C" int media_content_scan_file(const char *path)
 {
 	std::string full_path;
 	if (!absolute_path(path, &full_path))
-		return MEDIA_CONTENT_ERROR_INVALID_PARAMETER;
+		return MEDIA_DB_ERROR_INVALID_PARAMETER;
 
 	File file(fopen(full_path.c_str(), "rb"));
 	if (!file)
-		return errno == EACCES ? MEDIA_CONTENT_ERROR_PERMISSION_DENIED : MEDIA_CONTENT_ERROR_INVALID_PARAMETER;
+		return errno == EACCES ? MEDIA_DB_ERROR_PERMISSION_DENIED : MEDIA_DB_ERROR_INVALID_PARAMETER;
 	struct stat st;
 	if (fstat(fileno(file.get()), &st) != 0 || !S_ISREG(st.st_mode))
-		return MEDIA_CONTENT_ERROR_INVALID_PARAMETER;
+		return MEDIA_DB_ERROR_INVALID_PARAMETER;
 	MediaInfo info;
 	if (sniff(file.get(), st.st_size, &info) != Sniff::media)
-		return MEDIA_CONTENT_ERROR_INVALID_PARAMETER;
+		return MEDIA_DB_ERROR_INVALID_PARAMETER;
 	file.reset();
 
 	Db local;
 	sqlite3 *db;
 	int result = use_db(&local, &db);
-	if (result != MEDIA_CONTENT_ERROR_NONE)
+	if (result != MEDIA_DB_ERROR_NONE)
 		return result;
 	sqlite3_stmt *raw = nullptr;
 	int rc = sqlite3_prepare_v2(db,
@@ -403,19 +403,19 @@ extern "C" int media_content_scan_file(const char *path)
 	sqlite3_bind_int(raw, 5, info.height);
 	sqlite3_bind_int64(raw, 6, st.st_mtime);
 	rc = sqlite3_step(raw);
-	return rc == SQLITE_DONE ? MEDIA_CONTENT_ERROR_NONE : db_error(rc);
+	return rc == SQLITE_DONE ? MEDIA_DB_ERROR_NONE : db_error(rc);
 }
 
-extern "C" int media_content_lookup(const char *path, media_content_record_s *record)
+extern "C" int media_db_lookup(const char *path, Media_Db_Row *record)
 {
 	std::string full_path;
 	if (!record || !absolute_path(path, &full_path))
-		return MEDIA_CONTENT_ERROR_INVALID_PARAMETER;
+		return MEDIA_DB_ERROR_INVALID_PARAMETER;
 
 	Db local;
 	sqlite3 *db;
 	int result = use_db(&local, &db);
-	if (result != MEDIA_CONTENT_ERROR_NONE)
+	if (result != MEDIA_DB_ERROR_NONE)
 		return result;
 	sqlite3_stmt *raw = nullptr;
 	int rc = sqlite3_prepare_v2(db,
@@ -427,7 +427,7 @@ extern "C" int media_content_lookup(const char *path, media_content_record_s *re
 	sqlite3_bind_text(raw, 1, full_path.c_str(), -1, SQLITE_TRANSIENT);
 	rc = sqlite3_step(raw);
 	if (rc == SQLITE_DONE)
-		return MEDIA_CONTENT_ERROR_INVALID_OPERATION;
+		return MEDIA_DB_ERROR_INVALID_OPERATION;
 	if (rc != SQLITE_ROW)
 		return db_error(rc);
 	const unsigned char *mime = sqlite3_column_text(raw, 0);
@@ -436,5 +436,5 @@ extern "C" int media_content_lookup(const char *path, media_content_record_s *re
 	record->width = sqlite3_column_int(raw, 2);
 	record->height = sqlite3_column_int(raw, 3);
 	record->modified_time = sqlite3_column_int64(raw, 4);
-	return MEDIA_CONTENT_ERROR_NONE;
+	return MEDIA_DB_ERROR_NONE;
 }
