@@ -76,23 +76,37 @@ bool press_back(Demo_Script *s)
 	return true;
 }
 
+/* An action is NAME or NAME:ARGUMENT; `arg` is the text after the colon
+ * ("" without one). */
 struct Action {
 	const char *name;
-	bool (*run)(Demo_Script *);
+	bool (*run)(Demo_Script *, const std::string &arg);
 };
 
 constexpr Action actions_table[] = {
-	{"crop", [](Demo_Script *s) { return tap_tool(s, 0); }},
-	{"rotate-left", [](Demo_Script *s) { return tap_tool(s, 1); }},
-	{"rotate-right", [](Demo_Script *s) { return tap_tool(s, 2); }},
-	{"effect", [](Demo_Script *s) { return tap_tool(s, 3); }},
-	{"cancel", [](Demo_Script *s) { return tap_funcbar_button(s, "title_left_text_btn"); }},
-	{"done", [](Demo_Script *s) { return tap_funcbar_button(s, "title_right_text_btn"); }},
-	{"discard", [](Demo_Script *s) { return tap_popup_button(s, "deletepopup", "button2"); }},
-	{"keep", [](Demo_Script *s) { return tap_popup_button(s, "deletepopup", "button1"); }},
-	{"storage-ok", [](Demo_Script *s) { return tap_popup_button(s, "okcancelpopup", "button1"); }},
-	{"back", press_back},
+	{"crop", [](Demo_Script *s, const std::string &) { return tap_tool(s, 0); }},
+	{"rotate-left", [](Demo_Script *s, const std::string &) { return tap_tool(s, 1); }},
+	{"rotate-right", [](Demo_Script *s, const std::string &) { return tap_tool(s, 2); }},
+	{"effect", [](Demo_Script *s, const std::string &) { return tap_tool(s, 3); }},
+	{"cancel", [](Demo_Script *s, const std::string &) { return tap_funcbar_button(s, "title_left_text_btn"); }},
+	{"done", [](Demo_Script *s, const std::string &) { return tap_funcbar_button(s, "title_right_text_btn"); }},
+	{"discard", [](Demo_Script *s, const std::string &) { return tap_popup_button(s, "deletepopup", "button2"); }},
+	{"keep", [](Demo_Script *s, const std::string &) { return tap_popup_button(s, "deletepopup", "button1"); }},
+	{"storage-ok",
+	 [](Demo_Script *s, const std::string &) { return tap_popup_button(s, "okcancelpopup", "button1"); }},
+	{"back", [](Demo_Script *s, const std::string &) { return press_back(s); }},
 };
+
+const Action *action_find(const std::string &step, std::string *arg)
+{
+	size_t colon = step.find(':');
+	std::string name = step.substr(0, colon);
+	*arg = colon == std::string::npos ? std::string() : step.substr(colon + 1);
+	for (const auto &a : actions_table)
+		if (name == a.name)
+			return &a;
+	return nullptr;
+}
 
 /* The picture is in place when the editor's image holds pixels (a large
  * picture arrives later, from the preload). */
@@ -121,15 +135,13 @@ bool demo_script_run(Demo_Script *s, const std::vector<std::string> &actions)
 
 	int step = 0;
 	for (const auto &name : actions) {
-		const Action *action = nullptr;
-		for (const auto &a : actions_table)
-			if (name == a.name)
-				action = &a;
+		std::string arg;
+		const Action *action = action_find(name, &arg);
 		if (!action) {
 			fprintf(stderr, "ie-demo-host: unknown action '%s' (known: %s)\n", name.c_str(), demo_actions_help());
 			return false;
 		}
-		if (*s->closed || !action->run(s)) {
+		if (*s->closed || !action->run(s, arg)) {
 			fprintf(stderr, "ie-demo-host: cannot %s: not on screen\n", name.c_str());
 			return false;
 		}
