@@ -1,9 +1,12 @@
-/* End to end: the demo host drives the real editor with taps on its real
- * widgets, as a person would, and the saved file is checked on disk and in
- * the media database. */
+/* End to end through the README's demo command (`./ie demo`, on this build
+ * tree): the demo host drives the real editor with taps on its real widgets,
+ * as a person would, and the saved file is checked on disk and in the media
+ * database. */
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <cstdio>
+#include <filesystem>
 #include <fstream>
 #include <media_db.h>
 
@@ -13,10 +16,13 @@ namespace {
 
 class Demo : public iet::EflTest {
 protected:
-	/* Runs the host on `picture` with `args`; returns its output. */
-	std::string run_host(const std::string &picture, const std::string &args, int *status)
+	/* Runs `ie demo` on `picture` with `args` (the build tree as `tree`);
+	 * returns its output. */
+	std::string run_host(const std::string &picture, const std::string &args, int *status,
+			     const std::string &tree = IE_BUILD_TREE)
 	{
-		std::string command = std::string(IE_DEMO_HOST) + " --headless '" + picture + "' " + args + " 2>&1";
+		std::string command = "IE_BUILD_DIR='" + tree + "' " IE_TEST_SOURCE_DIR "/ie demo --headless '" +
+				      picture + "' " + args + " 2>&1";
 		FILE *pipe = popen(command.c_str(), "r");
 		std::string output;
 		char buffer[512];
@@ -101,6 +107,27 @@ TEST_F(Demo, HeadlessRunWritesAScreenshot)
 	EXPECT_EQ(w, 720);
 	EXPECT_EQ(h, 1280);
 	evas_object_del(check);
+}
+
+/* A checkout deep in the file system puts the build tree, and with it EFL's
+ * home, at a long path; efreetd's socket must still get a short one, or the
+ * daemon aborts and the editor waits 10 seconds for it. */
+TEST_F(Demo, ADeepCheckoutStartsWithoutWaitingForTheDesktopDaemon)
+{
+	std::string deep = iet::temp_dir();
+	while (deep.size() < 150)
+		deep += "/a-deep-checkout-path";
+	ASSERT_TRUE(std::filesystem::create_directories(deep));
+	std::string tree = deep + "/build";
+	ASSERT_EQ(symlink(IE_BUILD_TREE, tree.c_str()), 0);
+	std::string picture = iet::temp_dir() + "/c.jpg";
+	ASSERT_TRUE(iet::write_picture(picture, 320, 240));
+
+	int status = 0;
+	std::string output = run_host(picture, "--screenshot " + iet::temp_dir() + "/c.png", &status, tree);
+	EXPECT_EQ(status, 0) << output;
+	EXPECT_EQ(output.find("buffer overflow"), std::string::npos) << output;
+	EXPECT_EQ(output.find("efreetd"), std::string::npos) << output;
 }
 
 } // namespace

@@ -39,9 +39,14 @@ void record_eina_log(const Eina_Log_Domain *d, Eina_Log_Level level, const char 
 std::string data_dir;
 
 /* EFL's home (efreet's cache, Elementary's config) is shared by the test
- * processes of a build when IE_TEST_HOME names it: efreetd then starts once
- * instead of once per test. Each process keeps its own data directory for
- * the platform services. */
+ * processes of a build when IE_TEST_HOME names it, so that efreet builds its
+ * cache once. The runtime directory holds efreetd's socket, whose path the
+ * daemon cannot take beyond about 90 characters (it aborts, and every EFL
+ * process then waits 10 seconds for it): it is the short private directory
+ * the `ie` script made for the run (IE_TEST_RUNTIME_DIR), or one of this
+ * process's own under the system's temporary folder, wherever the build tree
+ * lies. Each process keeps its own data directory for the platform
+ * services. */
 void prepare_environment()
 {
 	std::string scratch = (std::filesystem::temp_directory_path() / "ie-test-XXXXXX").string();
@@ -49,13 +54,16 @@ void prepare_environment()
 		data_dir = scratch;
 	const char *shared_home = getenv("IE_TEST_HOME");
 	std::string home = shared_home ? shared_home : data_dir + "/home";
-	for (const char *sub : {"cache", "config", "runtime"})
+	for (const char *sub : {"cache", "config"})
 		std::filesystem::create_directories(home + "/" + sub);
-	std::filesystem::permissions(home + "/runtime", std::filesystem::perms::owner_all);
+	const char *run_runtime = getenv("IE_TEST_RUNTIME_DIR");
+	std::string runtime = run_runtime && *run_runtime ? run_runtime : data_dir + "/runtime";
+	std::filesystem::create_directories(runtime);
+	std::filesystem::permissions(runtime, std::filesystem::perms::owner_all);
 	setenv("HOME", home.c_str(), 1);
 	setenv("XDG_CACHE_HOME", (home + "/cache").c_str(), 1);
 	setenv("XDG_CONFIG_HOME", (home + "/config").c_str(), 1);
-	setenv("XDG_RUNTIME_DIR", (home + "/runtime").c_str(), 1);
+	setenv("XDG_RUNTIME_DIR", runtime.c_str(), 1);
 	setenv("ELM_ENGINE", "buffer", 1);
 	setenv("ECORE_NO_SYSTEM_MODULES", "1", 1);
 	setenv("ECORE_EVAS_FORCE_SYNC_RENDER", "1", 1);
