@@ -98,8 +98,9 @@ protected:
 		auto pixels = picture_pixels();
 		Rect p = shown();
 		float kx = static_cast<float>(iw) / p.w, ky = static_cast<float>(ih) / p.h;
-		*cw = static_cast<int>(cut.w * kx);
-		*ch = static_cast<int>(cut.h * ky);
+		/* Never less than one pixel. */
+		*cw = std::max(1, static_cast<int>(cut.w * kx));
+		*ch = std::max(1, static_cast<int>(cut.h * ky));
 		std::vector<uint32_t> out(static_cast<size_t>(*cw) * *ch, 0xdeadbeef);
 		IEL_Image src = {static_cast<uint32_t>(iw), static_cast<uint32_t>(ih), IEL_FORMAT_BGRA8888,
 				 reinterpret_cast<uint8_t *>(pixels.data())};
@@ -387,42 +388,43 @@ TEST_F(CropView, SecondFingerPausesTheBoxWhichThenKeepsToThePicture)
 
 TEST_F(CropView, DoneKeepsToThePartOfTheRectangleOverThePicture)
 {
-	ASSERT_NE(open_editor_on_picture(1280, 960), nullptr);
-	const auto original = picture_pixels();
+	/* A quick pinch leaves the box where it was over the zoomed picture:
+	 * above the fitted one, across its top edge, or 5 pixels into a
+	 * picture shown far larger than its pixels. */
+	const struct {
+		const char *name;
+		int w, h;
+		int top, bottom;
+	} cases[] = {
+		{"beside the picture", 1280, 960, 150, 300},
+		{"across its top edge", 1280, 960, 300, 500},
+		{"less than a pixel into it", 64, 48, 300, 423},
+	};
+	for (const auto &c : cases) {
+		SCOPED_TRACE(c.name);
+		destroy_editor();
+		ASSERT_NE(open_editor_on_picture(c.w, c.h), nullptr);
+		const auto original = picture_pixels();
+		open_crop();
+		pinch_picture(40, 400);
+		drag_box(0.5, 0.0, 0, c.top - region().y);
+		drag_box(0.5, 1.0, 0, c.bottom - region().y - region().h);
+		snap_back_to_fit();
+		const Rect p = shown(), r = region();
+		ASSERT_EQ(r.y, c.top);
+		ASSERT_EQ(r.y + r.h, c.bottom);
+		ASSERT_LT(r.y, p.y) << "the box starts above the picture";
 
-	/* Left above the picture by a quick pinch: nothing to crop. */
-	open_crop();
-	pinch_picture(40, 400);
-	drag_box(0.5, 0.0, 0, 150 - region().y);
-	drag_box(0.5, 1.0, 0, 300 - region().y - region().h);
-	snap_back_to_fit();
-	Rect p = shown(), r = region();
-	ASSERT_LT(r.y + r.h, p.y) << "the box lies above the picture";
-	tap_button(vh->done_btn);
-	int w, h;
-	picture_size(&w, &h);
-	EXPECT_EQ(w, 1280);
-	EXPECT_EQ(h, 960);
-	EXPECT_TRUE(picture_pixels() == original);
-	EXPECT_FALSE(vh->edited);
-
-	/* Straddling the picture's top edge: only the part over it is kept. */
-	open_crop();
-	pinch_picture(40, 400);
-	drag_box(0.5, 0.0, 0, 300 - region().y);
-	drag_box(0.5, 1.0, 0, 500 - region().y - region().h);
-	snap_back_to_fit();
-	p = shown();
-	r = region();
-	ASSERT_LT(r.y, p.y);
-	ASSERT_GT(r.y + r.h, p.y);
-	int cw, ch;
-	const auto expected = expected_crop({r.x, p.y, r.w, r.y + r.h - p.y}, &cw, &ch);
-	tap_button(vh->done_btn);
-	picture_size(&w, &h);
-	ASSERT_EQ(w, cw);
-	ASSERT_EQ(h, ch);
-	EXPECT_TRUE(picture_pixels() == expected);
+		int cw = c.w, ch = c.h;
+		const auto expected = r.y + r.h > p.y ? expected_crop({r.x, p.y, r.w, r.y + r.h - p.y}, &cw, &ch) : original;
+		tap_button(vh->done_btn);
+		int w, h;
+		picture_size(&w, &h);
+		ASSERT_EQ(w, cw);
+		ASSERT_EQ(h, ch);
+		EXPECT_TRUE(picture_pixels() == expected);
+		EXPECT_EQ(vh->edited, r.y + r.h > p.y);
+	}
 }
 
 TEST_F(CropView, WindowRotationKeepsTheToolBarHiddenAndTheBoxOnThePicture)
