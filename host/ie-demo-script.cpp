@@ -1,6 +1,8 @@
 #include "ie-demo-script.h"
 
+#include <algorithm>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 
 namespace {
@@ -76,6 +78,128 @@ bool press_back(Demo_Script *s)
 	return true;
 }
 
+/* Presses at (x0, y0) and moves there in ten steps to (x1, y1) before
+ * lifting the finger. */
+void drag_at(Evas_Object *win, int x0, int y0, int x1, int y1)
+{
+	Evas *e = evas_object_evas_get(win);
+	evas_event_feed_mouse_move(e, x0, y0, event_clock += 10, nullptr);
+	evas_event_feed_mouse_down(e, 1, EVAS_BUTTON_NONE, event_clock += 10, nullptr);
+	const int steps = 10;
+	for (int i = 1; i <= steps; i++)
+		evas_event_feed_mouse_move(e, x0 + (x1 - x0) * i / steps, y0 + (y1 - y0) * i / steps, event_clock += 10,
+					   nullptr);
+	evas_event_feed_mouse_up(e, 1, EVAS_BUTTON_NONE, event_clock += 10, nullptr);
+}
+
+bool parse_int(const std::string &text, int *value)
+{
+	char *end = nullptr;
+	long v = strtol(text.c_str(), &end, 10);
+	if (text.empty() || *end || v < -100000 || v > 100000)
+		return false;
+	*value = static_cast<int>(v);
+	return true;
+}
+
+/* The crop box's rectangle, read from its edge lines (top, left, bottom,
+ * right in the order they were made). */
+bool crop_box_rect(Demo_Script *s, int *l, int *t, int *r, int *b)
+{
+	Evas_Object *box = evas_object_name_find(evas_object_evas_get(s->win), "SelectBox");
+	if (!box || !evas_object_visible_get(box))
+		return false;
+	Evas_Coord top[4] = {}, left[4] = {};
+	int lines = 0;
+	Eina_List *members = evas_object_smart_members_get(box);
+	void *member;
+	EINA_LIST_FREE(members, member) {
+		auto *o = static_cast<Evas_Object *>(member);
+		const char *type = evas_object_type_get(o);
+		if (!type || strcmp(type, "line"))
+			continue;
+		Evas_Coord *xy = lines == 0 ? top : lines == 1 ? left : nullptr;
+		if (xy)
+			evas_object_line_xy_get(o, &xy[0], &xy[1], &xy[2], &xy[3]);
+		lines++;
+	}
+	if (lines != 4)
+		return false;
+	*l = top[0];
+	*t = top[1];
+	*r = top[2];
+	*b = left[3];
+	return true;
+}
+
+/* drag:PART:DX:DY with PART one of the box's handles or "inside". */
+bool drag_crop_box(Demo_Script *s, const std::string &arg)
+{
+	size_t first = arg.find(':'), second = first == std::string::npos ? first : arg.find(':', first + 1);
+	int dx = 0, dy = 0;
+	if (second == std::string::npos || !parse_int(arg.substr(first + 1, second - first - 1), &dx) ||
+	    !parse_int(arg.substr(second + 1), &dy))
+		return false;
+	const std::string part = arg.substr(0, first);
+	int l, t, r, b;
+	if (!crop_box_rect(s, &l, &t, &r, &b))
+		return false;
+	const int mx = l + (r - l) / 2, my = t + (b - t) / 2;
+	const struct {
+		const char *name;
+		int x, y;
+	} points[] = {
+		{"top-left", l, t}, {"top", mx, t}, {"top-right", r, t}, {"left", l, my}, {"right", r, my},
+		{"bottom-left", l, b}, {"bottom", mx, b}, {"bottom-right", r, b}, {"inside", mx, my},
+	};
+	for (const auto &p : points) {
+		if (part == p.name) {
+			drag_at(s->win, p.x, p.y, p.x + dx, p.y + dy);
+			return true;
+		}
+	}
+	return false;
+}
+
+/* pinch:FACTOR: two fingers 200 pixels apart about the middle of the
+ * picture's visible part, spread (or closed) to FACTOR times that. */
+bool pinch_picture(Demo_Script *s, const std::string &arg)
+{
+	char *end = nullptr;
+	double factor = strtod(arg.c_str(), &end);
+	if (arg.empty() || *end || !(factor > 0.0 && factor <= 10.0))
+		return false;
+	Evas *e = evas_object_evas_get(s->win);
+	Evas_Object *image = evas_object_name_find(e, "mImage");
+	if (!image || !evas_object_visible_get(image))
+		return false;
+	Evas_Coord x, y, w, h, ww, wh;
+	evas_object_geometry_get(image, &x, &y, &w, &h);
+	evas_object_geometry_get(s->win, nullptr, nullptr, &ww, &wh);
+	const int x0 = std::max(x, 0), y0 = std::max(y, 0);
+	const int x1 = std::min(x + w, ww), y1 = std::min(y + h, wh);
+	if (x1 <= x0 || y1 <= y0)
+		return false;
+	const int cx = (x0 + x1) / 2, cy = (y0 + y1) / 2;
+	const int gap0 = 200, gap1 = static_cast<int>(gap0 * factor);
+	evas_event_feed_mouse_move(e, cx - gap0 / 2, cy, event_clock += 10, nullptr);
+	evas_event_feed_mouse_down(e, 1, EVAS_BUTTON_NONE, event_clock += 10, nullptr);
+	evas_event_feed_multi_down(e, 1, cx + gap0 / 2, cy, 1, 1, 1, 1, 0, cx + gap0 / 2, cy, EVAS_BUTTON_NONE,
+				   event_clock += 10, nullptr);
+	const int steps = 10;
+	int gap = gap0;
+	for (int i = 1; i <= steps; i++) {
+		gap = gap0 + (gap1 - gap0) * i / steps;
+		evas_event_feed_mouse_move(e, cx - gap / 2, cy, event_clock += 10, nullptr);
+		evas_event_feed_multi_move(e, 1, cx + gap / 2, cy, 1, 1, 1, 1, 0, cx + gap / 2, cy, event_clock += 10,
+					   nullptr);
+	}
+	evas_event_feed_multi_up(e, 1, cx + gap / 2, cy, 1, 1, 1, 1, 0, cx + gap / 2, cy, EVAS_BUTTON_NONE,
+				 event_clock += 10, nullptr);
+	evas_event_feed_mouse_up(e, 1, EVAS_BUTTON_NONE, event_clock += 10, nullptr);
+	return true;
+}
+
 /* An action is NAME or NAME:ARGUMENT; `arg` is the text after the colon
  * ("" without one). */
 struct Action {
@@ -95,6 +219,8 @@ constexpr Action actions_table[] = {
 	{"storage-ok",
 	 [](Demo_Script *s, const std::string &) { return tap_popup_button(s, "okcancelpopup", "button1"); }},
 	{"back", [](Demo_Script *s, const std::string &) { return press_back(s); }},
+	{"drag", drag_crop_box},
+	{"pinch", pinch_picture},
 };
 
 const Action *action_find(const std::string &step, std::string *arg)
@@ -124,7 +250,8 @@ bool picture_ready(Demo_Script *s)
 
 const char *demo_actions_help(void)
 {
-	return "crop rotate-left rotate-right effect cancel done discard keep storage-ok back";
+	return "crop rotate-left rotate-right effect cancel done discard keep storage-ok back "
+	       "drag:PART:DX:DY pinch:FACTOR";
 }
 
 bool demo_script_run(Demo_Script *s, const std::vector<std::string> &actions)
@@ -149,8 +276,11 @@ bool demo_script_run(Demo_Script *s, const std::vector<std::string> &actions)
 		step++;
 		printf("step %d: %s\n", step, name.c_str());
 		if (!s->shots_dir.empty() && !*s->closed) {
+			/* An argument's colons stay out of the file name. */
+			std::string label = name;
+			std::replace(label.begin(), label.end(), ':', '_');
 			char path[1024];
-			snprintf(path, sizeof(path), "%s/step-%02d-%s.png", s->shots_dir.c_str(), step, name.c_str());
+			snprintf(path, sizeof(path), "%s/step-%02d-%s.png", s->shots_dir.c_str(), step, label.c_str());
 			if (demo_screenshot(s->win, path))
 				printf("screenshot: %s\n", path);
 		}

@@ -72,6 +72,63 @@ TEST_F(Demo, RotateThenDoneWritesTheRotatedPictureBesideTheSource)
 	EXPECT_EQ(row.height, 800);
 }
 
+TEST_F(Demo, CropDragAndDoneWriteTheCroppedPicture)
+{
+	std::string dir = iet::temp_dir();
+	std::string picture = dir + "/view.jpg";
+	ASSERT_TRUE(iet::write_picture(picture, 4000, 3000, "quality=95"));
+	int status = 0;
+	std::string output =
+		run_host(picture, "--do crop --do drag:bottom-right:-200:-150 --do done --do done", &status);
+	ASSERT_EQ(status, 0) << output;
+	std::string path = saved_path(output);
+	ASSERT_EQ(path, dir + "/view_e001.jpg") << output;
+
+	/* Held at 1280 x 960 and shown 720 wide: the box starts 400 x 270 at
+	 * (160, 135) over the picture, the drag leaves 200 x 120 of it, which
+	 * is 355 x 213 picture pixels from (284, 240). */
+	Evas_Object *check = evas_object_image_add(evas());
+	evas_object_image_file_set(check, path.c_str(), nullptr);
+	int w = 0, h = 0;
+	evas_object_image_size_get(check, &w, &h);
+	ASSERT_EQ(w, 355);
+	ASSERT_EQ(h, 213);
+	/* The source's gradient: red follows x, green follows y. */
+	auto *pixels = static_cast<const uint32_t *>(evas_object_image_data_get(check, EINA_FALSE));
+	ASSERT_NE(pixels, nullptr);
+	for (auto [x, y] : {std::pair{2, 2}, std::pair{w - 3, 2}, std::pair{2, h - 3}, std::pair{w - 3, h - 3}}) {
+		uint32_t p = pixels[y * w + x];
+		EXPECT_NEAR(int((p >> 16) & 0xff), (284 + x) * 3.125 * 255 / 3999, 6) << x << "," << y;
+		EXPECT_NEAR(int((p >> 8) & 0xff), (240 + y) * 3.125 * 255 / 2999, 6) << x << "," << y;
+	}
+	evas_object_del(check);
+	Media_Db_Row row;
+	ASSERT_EQ(media_db_lookup(path.c_str(), &row), MEDIA_DB_ERROR_NONE);
+	EXPECT_EQ(row.width, 355);
+	EXPECT_EQ(row.height, 213);
+
+	/* Left with Cancel, the crop view changes nothing: a rotation then
+	 * saves the whole picture. */
+	output = run_host(picture,
+			  "--do crop --do drag:bottom-right:-200:-150 --do pinch:2 --do cancel --do rotate-right --do done",
+			  &status);
+	ASSERT_EQ(status, 0) << output;
+	path = saved_path(output);
+	ASSERT_EQ(path, dir + "/view_e002.jpg") << output;
+	check = evas_object_image_add(evas());
+	evas_object_image_file_set(check, path.c_str(), nullptr);
+	evas_object_image_size_get(check, &w, &h);
+	EXPECT_EQ(w, 960);
+	EXPECT_EQ(h, 1280);
+	evas_object_del(check);
+
+	/* A part that is not one of the box's, or no box at all, is refused. */
+	output = run_host(picture, "--do crop --do drag:middle:10:10", &status);
+	EXPECT_NE(status, 0) << output;
+	output = run_host(picture, "--do drag:inside:10:10", &status);
+	EXPECT_NE(status, 0) << output;
+}
+
 TEST_F(Demo, ClosingWithoutDoneSavesNothing)
 {
 	std::string dir = iet::temp_dir();

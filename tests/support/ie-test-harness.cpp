@@ -260,6 +260,35 @@ void two_finger_drag(Evas_Object *win, int x, int y, int gap, int dx, int dy, in
 	settle();
 }
 
+void finger_down(Evas_Object *win, int finger, int x, int y)
+{
+	if (finger == 0) {
+		mouse_down(win, x, y);
+		return;
+	}
+	Evas *e = canvas_of(win);
+	evas_event_feed_multi_down(e, finger, x, y, 1, 1, 1, 1, 0, x, y, EVAS_BUTTON_NONE, tick(), nullptr);
+}
+
+void finger_move(Evas_Object *win, int finger, int x, int y)
+{
+	Evas *e = canvas_of(win);
+	if (finger == 0)
+		evas_event_feed_mouse_move(e, x, y, tick(), nullptr);
+	else
+		evas_event_feed_multi_move(e, finger, x, y, 1, 1, 1, 1, 0, x, y, tick(), nullptr);
+}
+
+void finger_up(Evas_Object *win, int finger, int x, int y)
+{
+	if (finger == 0) {
+		mouse_up(win, x, y);
+		return;
+	}
+	Evas *e = canvas_of(win);
+	evas_event_feed_multi_up(e, finger, x, y, 1, 1, 1, 1, 0, x, y, EVAS_BUTTON_NONE, tick(), nullptr);
+}
+
 void key_press(Evas_Object *win, const char *keyname)
 {
 	Evas *e = canvas_of(win);

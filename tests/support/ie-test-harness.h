@@ -65,6 +65,12 @@ void drag(Evas_Object *win, int x0, int y0, int x1, int y1, int steps = 10);
 void pinch(Evas_Object *win, int cx, int cy, int gap0, int gap1, int steps = 10);
 /* Two fingers `gap` apart moved together by (dx, dy). */
 void two_finger_drag(Evas_Object *win, int x, int y, int gap, int dx, int dy, int steps = 10);
+/* Single touch points, for gestures the helpers above do not make: finger
+ * 0 is the mouse, any other number a further touch point. Each call is one
+ * event. */
+void finger_down(Evas_Object *win, int finger, int x, int y);
+void finger_move(Evas_Object *win, int finger, int x, int y);
+void finger_up(Evas_Object *win, int finger, int x, int y);
 /* A key press and release on the window ("Escape", "XF86Back", ...). */
 void key_press(Evas_Object *win, const char *keyname);
 

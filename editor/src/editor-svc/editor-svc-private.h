@@ -61,6 +61,10 @@ struct _Viewhandle {
 	int32_t win_rotation;
 	Assist_Font_Table *font_table;
 	void *log_handle;
+	/* Crop view: the pending creation of its selection box, and whether a
+	 * crop was ever applied to the picture. */
+	Ecore_Idler *crop_box_idler;
+	Eina_Bool cropped;
 };
 
 /* editor-svc.cpp */
@@ -85,10 +89,8 @@ void _on_layout_resized(void *data, Evas *e, Evas_Object *obj, void *event_info)
 void _on_menu_cancel(void *data, Evas_Object *obj, void *event_info);
 void _on_menu_done(void *data, Evas_Object *obj, void *event_info);
 void _popup_close(Viewhandle *vh);
-
-/* ie-crop-view.cpp: the selection rectangle in canvas coordinates, while
- * the crop view shows one. */
-Eina_Bool ie_crop_region_get(Viewhandle *vh, Evas_Coord *x, Evas_Coord *y, Evas_Coord *w, Evas_Coord *h);
+/* Done's crop: the picture replaced by its part under the selection box. */
+void __apply_crop(Viewhandle *vh);
 
 /* ie-log-manager.cpp */
 void *log_manager_create(void);

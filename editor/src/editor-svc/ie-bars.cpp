@@ -4,6 +4,7 @@
 
 #include "editor-svc-private.h"
 #include "ie-image.h"
+#include "ie-selectbox.h"
 
 namespace {
 
@@ -276,6 +277,8 @@ void _on_layout_resized(void *data, Evas *, Evas_Object *, void *)
 		break;
 	case IE_VIEW_TYPE_CROP:
 		elm_object_signal_emit(vh->layout, "elm,state,toolbar,hide", "elm");
+		if (vh->selectbox)
+			ie_selectbox_rotate(vh->selectbox);
 		break;
 	default:
 		break;

@@ -1,5 +1,9 @@
 /* What Cancel, Done and the back key do in each view, and the editor's two
  * popups (discard changes; not enough memory). */
+#include <algorithm>
+#include <cstring>
+#include <memory>
+
 #include <app_launch.h>
 #include <gadget_window.h>
 
@@ -7,6 +11,7 @@
 #include "ie-engine.h"
 #include "ie-image.h"
 #include "ie-save.h"
+#include "ie-selectbox.h"
 
 #define IE_STORAGE_SETTINGS_APP_ID "setting-storage-efl"
 
@@ -126,53 +131,66 @@ static void back_to_main_view(Viewhandle *vh)
 	ie_image_refit(vh->main_image);
 }
 
-/* Replaces the picture by the part under the selection rectangle, mapped
- * from canvas coordinates over the displayed picture to its pixels. A
- * region that does not lie inside the picture leaves it unchanged. */
-static void __apply_crop(Viewhandle *vh)
+/* Replaces the picture by its part under the selection rectangle, mapped
+ * from canvas coordinates over the displayed picture to its pixels. Only the
+ * part of the rectangle over the picture counts, and at least one pixel of
+ * it: a rectangle beside the picture leaves the picture as it is. */
+void __apply_crop(Viewhandle *vh)
 {
-	Evas_Coord sx, sy, sw, sh;
-	if (!ie_crop_region_get(vh, &sx, &sy, &sw, &sh))
+	IE_CHECK_AS(vh, "data");
+	if (!vh->selectbox)
 		return;
+	Evas_Coord sx, sy, sw, sh;
+	ie_selectbox_get_region(vh->selectbox, &sx, &sy, &sw, &sh);
 
 	Evas_Object *img = ie_image_object_get(vh->main_image);
 	int iw = 0, ih = 0;
 	evas_object_image_size_get(img, &iw, &ih);
+	Evas_Coord dx, dy, dw, dh;
+	ie_image_geometry_get(vh->main_image, &dx, &dy, &dw, &dh);
+	const Evas_Coord left = std::max(sx, dx), top = std::max(sy, dy);
+	const Evas_Coord right = std::min(sx + sw, dx + dw), bottom = std::min(sy + sh, dy + dh);
+	if (iw <= 0 || ih <= 0 || right <= left || bottom <= top)
+		return;
+
+	const float kx = static_cast<float>(iw) / dw;
+	const float ky = static_cast<float>(ih) / dh;
+	const int x0 = std::clamp(static_cast<int>((left - dx) * kx), 0, iw - 1);
+	const int y0 = std::clamp(static_cast<int>((top - dy) * ky), 0, ih - 1);
+	const int cw = std::clamp(static_cast<int>((right - left) * kx), 1, iw - x0);
+	const int ch = std::clamp(static_cast<int>((bottom - top) * ky), 1, ih - y0);
+
+	/* Not zero-filled: the crop writes every byte. */
+	const size_t bytes = static_cast<size_t>(cw) * ch * 4;
+	std::unique_ptr<uint8_t, decltype(&free)> cropped(static_cast<uint8_t *>(malloc(bytes)), free);
+	if (!cropped) {
+		IE_LOG_E("Output.pbBuf is null calloc Failed ");
+		return;
+	}
 	auto *pixels = static_cast<uint8_t *>(ie_image_data_get(vh->main_image));
 	if (!pixels) {
 		IE_LOG_E("Image Internal Buffer Get Failed");
 		return;
 	}
 	IEL_Image source = {static_cast<uint32_t>(iw), static_cast<uint32_t>(ih), IEL_FORMAT_BGRA8888, pixels};
-
-	Evas_Coord dx, dy, dw, dh;
-	ie_image_geometry_get(vh->main_image, &dx, &dy, &dw, &dh);
-	if (dw <= 0 || dh <= 0)
+	IEL_Image region = {static_cast<uint32_t>(cw), static_cast<uint32_t>(ch), IEL_FORMAT_BGRA8888, cropped.get()};
+	if (IEL_Crop_Image(&source, &region, x0, y0) != IEL_OK) {
+		evas_object_image_data_set(img, pixels);
 		return;
-	float kx = static_cast<float>(iw) / dw;
-	float ky = static_cast<float>(ih) / dh;
-	int cw = static_cast<int>(sw * kx);
-	int ch = static_cast<int>(sh * ky);
-	if (cw > 0 && ch > 0) {
-		auto *cropped = static_cast<uint8_t *>(calloc(static_cast<size_t>(cw) * ch, 4));
-		if (!cropped) {
-			IE_LOG_E("Output.pbBuf is null calloc Failed ");
-			return;
-		}
-		IEL_Image region = {static_cast<uint32_t>(cw), static_cast<uint32_t>(ch), IEL_FORMAT_BGRA8888, cropped};
-		int x0 = static_cast<int>((sx - dx) * kx);
-		int y0 = static_cast<int>((sy - dy) * ky);
-		if (IEL_Crop_Image(&source, &region, x0, y0) != IEL_OK) {
-			free(cropped);
-			return;
-		}
-		evas_object_image_data_set(img, NULL);
-		evas_object_image_size_set(img, cw, ch);
-		evas_object_image_data_copy_set(img, cropped);
-		evas_object_image_data_update_add(img, 0, 0, cw, ch);
-		free(cropped);
 	}
+
+	evas_object_image_data_set(img, NULL);
+	evas_object_image_size_set(img, cw, ch);
+	void *target = evas_object_image_data_get(img, EINA_TRUE);
+	if (!target) {
+		IE_LOG_E("evas_object_image_data_get Failed ");
+		return;
+	}
+	memcpy(target, cropped.get(), bytes);
+	evas_object_image_data_set(img, target);
+	evas_object_image_data_update_add(img, 0, 0, cw, ch);
 	vh->edited = EINA_TRUE;
+	vh->cropped = EINA_TRUE;
 }
 
 void _on_menu_cancel(void *data, Evas_Object *, void *)
