@@ -79,8 +79,10 @@ bool press_back(Demo_Script *s)
 }
 
 /* A finger pressed at (x0, y0), moved to (x1, y1) in `steps` moves `ms`
- * apart, held still a moment (so that nothing flicks on) and lifted. */
-void drag_at(Evas_Object *win, int x0, int y0, int x1, int y1, int steps, unsigned int ms)
+ * apart and lifted. With `scrolling` the loop runs between the moves, as
+ * a scroller follows the finger only on its animator's ticks, and the
+ * finger rests a moment before it lifts, so that nothing flicks on. */
+void drag_at(Evas_Object *win, int x0, int y0, int x1, int y1, int steps, unsigned int ms, bool scrolling)
 {
 	Evas *e = evas_object_evas_get(win);
 	evas_event_feed_mouse_move(e, x0, y0, event_clock += ms, nullptr);
@@ -88,10 +90,13 @@ void drag_at(Evas_Object *win, int x0, int y0, int x1, int y1, int steps, unsign
 	for (int i = 1; i <= steps; i++) {
 		evas_event_feed_mouse_move(e, x0 + (x1 - x0) * i / steps, y0 + (y1 - y0) * i / steps, event_clock += ms,
 					   nullptr);
-		loop_for(ms / 1000.0);
+		if (scrolling)
+			loop_for(ms / 1000.0);
+		else
+			edje_message_signal_process();
 	}
-	for (int i = 0; i < 3; i++) {
-		evas_event_feed_mouse_move(e, x1, y1, event_clock += 100, nullptr);
+	if (scrolling) {
+		evas_event_feed_mouse_move(e, x1, y1, event_clock += 300, nullptr);
 		loop_for(0.1);
 	}
 	evas_event_feed_mouse_up(e, 1, EVAS_BUTTON_NONE, event_clock += ms, nullptr);
@@ -168,8 +173,9 @@ bool tap_effect(Demo_Script *s, const std::string &name)
 			return true;
 		}
 
-		/* Swipe the item towards the middle, at most half a grid at a time;
-		 * an item not laid out yet lies beyond the last one that is. */
+		/* Swipe the item towards the middle, at most three quarters of the
+		 * grid at a time; an item not laid out yet lies beyond the last one
+		 * that is. */
 		int length = horizontal ? gw : gh;
 		int offset;
 		if (realized) {
@@ -184,12 +190,12 @@ bool tap_effect(Demo_Script *s, const std::string &name)
 			eina_list_free(shown);
 			offset = index < first_shown ? -length : length;
 		}
-		offset = std::max(-length / 2, std::min(length / 2, offset));
+		offset = std::max(-length * 3 / 8, std::min(length * 3 / 8, offset / 2));
 		int cx = gx + gw / 2, cy = gy + gh / 2;
 		if (horizontal)
-			drag_at(s->win, cx, cy, cx - offset, cy, 20, 30);
+			drag_at(s->win, cx + offset, cy, cx - offset, cy, 15, 30, true);
 		else
-			drag_at(s->win, cx, cy, cx, cy - offset, 20, 30);
+			drag_at(s->win, cx, cy + offset, cx, cy - offset, 15, 30, true);
 		wait_for_grid(grid);
 	}
 	return false;
@@ -211,7 +217,7 @@ bool drag_intensity(Demo_Script *s, const std::string &arg)
 	Evas_Coord x, y, w, h;
 	evas_object_geometry_get(area, &x, &y, &w, &h);
 	int x0 = x + w / 2 - int(dx) / 2, cy = y + h / 2;
-	drag_at(s->win, x0, cy, x0 + int(dx), cy, std::max(1, int(std::labs(dx)) / 2), 10);
+	drag_at(s->win, x0, cy, x0 + int(dx), cy, std::max(1, int(std::labs(dx)) / 2), 10, false);
 	return true;
 }
 
