@@ -501,6 +501,9 @@ void ie_create_effect_view(Viewhandle *vh)
 	if (vh->layout)
 		elm_object_signal_emit(vh->layout, portrait ? "effect,portrait" : "effect,landscape", "elm");
 
+	/* Nothing is picked in a new view, also when the last one was left
+	 * through another tool: a pick of the same effect must run again. */
+	vh->effect_index = -1;
 	vh->effect_buf_row = -1;
 	vh->effect_last_alpha = IE_EFFECT_NO_ALPHA;
 	vh->slider_drag_value = -1;
