@@ -63,8 +63,7 @@ struct _Viewhandle {
 	Assist_Font_Table *font_table;
 	void *log_handle;
 
-	/* Effect view: its idlers, each cancelled on its own when the view
-	 * closes, and the state that ties the picture to the slider. */
+	/* Effect view: its own idlers, and what ties the picture to the slider. */
 	Ecore_Idler *effect_update_idler;
 	Ecore_Idler *effect_grid_idler;
 	float effect_last_alpha;
@@ -113,8 +112,8 @@ typedef struct {
 void SetThumbnailBuffer(Viewhandle *vh);
 Evas_Object *_effect_content_get(void *data, Evas_Object *obj, const char *part);
 char *_effect_text_get(void *data, Evas_Object *obj, const char *part);
-/* The full-size effect of `row` on the picture; false when it failed and
- * the picture was left as it was. */
+/* The full-size effect of `row` on the picture; false when it failed, the
+ * picture then left as it was found. */
 Eina_Bool generateEffect(Viewhandle *vh, int row);
 void generateEffectAlpha(Viewhandle *vh, float alpha);
 /* Schedules the scrolling of the effect grid to the picked item. */
