@@ -82,7 +82,7 @@ bool press_back(Demo_Script *s)
  * apart and lifted. With `scrolling` the loop runs between the moves, as
  * a scroller follows the finger only on its animator's ticks, and the
  * finger rests a moment before it lifts, so that nothing flicks on. */
-void drag_at(Evas_Object *win, int x0, int y0, int x1, int y1, int steps, unsigned int ms, bool scrolling)
+void slide_at(Evas_Object *win, int x0, int y0, int x1, int y1, int steps, unsigned int ms, bool scrolling)
 {
 	Evas *e = evas_object_evas_get(win);
 	evas_event_feed_mouse_move(e, x0, y0, event_clock += ms, nullptr);
@@ -193,9 +193,9 @@ bool tap_effect(Demo_Script *s, const std::string &name)
 		offset = std::max(-length * 3 / 8, std::min(length * 3 / 8, offset / 2));
 		int cx = gx + gw / 2, cy = gy + gh / 2;
 		if (horizontal)
-			drag_at(s->win, cx + offset, cy, cx - offset, cy, 15, 30, true);
+			slide_at(s->win, cx + offset, cy, cx - offset, cy, 15, 30, true);
 		else
-			drag_at(s->win, cx, cy + offset, cx, cy - offset, 15, 30, true);
+			slide_at(s->win, cx, cy + offset, cx, cy - offset, 15, 30, true);
 		wait_for_grid(grid);
 	}
 	return false;
@@ -217,7 +217,7 @@ bool drag_intensity(Demo_Script *s, const std::string &arg)
 	Evas_Coord x, y, w, h;
 	evas_object_geometry_get(area, &x, &y, &w, &h);
 	int x0 = x + w / 2 - int(dx) / 2, cy = y + h / 2;
-	drag_at(s->win, x0, cy, x0 + int(dx), cy, std::max(1, int(std::labs(dx)) / 2), 10, false);
+	slide_at(s->win, x0, cy, x0 + int(dx), cy, std::max(1, int(std::labs(dx)) / 2), 10, false);
 	return true;
 }
 
