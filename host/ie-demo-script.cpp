@@ -78,18 +78,28 @@ bool press_back(Demo_Script *s)
 	return true;
 }
 
-/* Presses at (x0, y0) and moves there in ten steps to (x1, y1) before
- * lifting the finger. */
-void drag_at(Evas_Object *win, int x0, int y0, int x1, int y1)
+/* A finger pressed at (x0, y0), moved to (x1, y1) in `steps` moves `ms`
+ * apart and lifted. With `scrolling` the loop runs between the moves, as
+ * a scroller follows the finger only on its animator's ticks, and the
+ * finger rests a moment before it lifts, so that nothing flicks on. */
+void slide_at(Evas_Object *win, int x0, int y0, int x1, int y1, int steps, unsigned int ms, bool scrolling)
 {
 	Evas *e = evas_object_evas_get(win);
-	evas_event_feed_mouse_move(e, x0, y0, event_clock += 10, nullptr);
-	evas_event_feed_mouse_down(e, 1, EVAS_BUTTON_NONE, event_clock += 10, nullptr);
-	const int steps = 10;
-	for (int i = 1; i <= steps; i++)
-		evas_event_feed_mouse_move(e, x0 + (x1 - x0) * i / steps, y0 + (y1 - y0) * i / steps, event_clock += 10,
+	evas_event_feed_mouse_move(e, x0, y0, event_clock += ms, nullptr);
+	evas_event_feed_mouse_down(e, 1, EVAS_BUTTON_NONE, event_clock += ms, nullptr);
+	for (int i = 1; i <= steps; i++) {
+		evas_event_feed_mouse_move(e, x0 + (x1 - x0) * i / steps, y0 + (y1 - y0) * i / steps, event_clock += ms,
 					   nullptr);
-	evas_event_feed_mouse_up(e, 1, EVAS_BUTTON_NONE, event_clock += 10, nullptr);
+		if (scrolling)
+			loop_for(ms / 1000.0);
+		else
+			edje_message_signal_process();
+	}
+	if (scrolling) {
+		evas_event_feed_mouse_move(e, x1, y1, event_clock += 300, nullptr);
+		loop_for(0.1);
+	}
+	evas_event_feed_mouse_up(e, 1, EVAS_BUTTON_NONE, event_clock += ms, nullptr);
 }
 
 bool parse_int(const std::string &text, int *value)
@@ -154,9 +164,108 @@ bool drag_crop_box(Demo_Script *s, const std::string &arg)
 	};
 	for (const auto &p : points) {
 		if (part == p.name) {
-			drag_at(s->win, p.x, p.y, p.x + dx, p.y + dy);
+			slide_at(s->win, p.x, p.y, p.x + dx, p.y + dy, 10, 10, false);
 			return true;
 		}
+	}
+	return false;
+}
+
+/* The effect grid's items in order, by the English names of the actions. */
+constexpr const char *effect_names[] = {
+	"vintage", "sunshine", "nostalgia", "yellow-glow", "blur", "soft-glow", "old-photo",
+	"retro", "greyscale", "sepia", "faded-colours", "downlight", "sharpen", "sketch",
+	"negative", "oil-paint", "posterise", "cartoon", "pop-art", "magic-pen",
+};
+
+Evas_Object *effect_grid(Demo_Script *s)
+{
+	Evas_Object *grid = elm_object_part_content_get(s->editor_view, "elm.swallow.effecttray");
+	return grid && evas_object_visible_get(grid) ? grid : nullptr;
+}
+
+/* Lets the grid's own scrolling end. */
+void wait_for_grid(Evas_Object *grid)
+{
+	Evas_Coord last_x = -1, last_y = -1;
+	for (int tries = 0; tries < 40; tries++) {
+		loop_for(0.05);
+		Evas_Coord x, y;
+		elm_scroller_region_get(grid, &x, &y, nullptr, nullptr);
+		if (x == last_x && y == last_y)
+			return;
+		last_x = x;
+		last_y = y;
+	}
+}
+
+/* Opens the effect view if needed, swipes the grid until the effect's item
+ * is wholly on screen, and taps it. */
+bool tap_effect(Demo_Script *s, const std::string &name)
+{
+	int index = -1;
+	for (int i = 0; i < int(sizeof(effect_names) / sizeof(effect_names[0])); i++)
+		if (name == effect_names[i])
+			index = i;
+	if (index < 0) {
+		fprintf(stderr, "ie-demo-host: no effect '%s'\n", name.c_str());
+		return false;
+	}
+	Evas_Object *grid = effect_grid(s);
+	if (!grid) {
+		if (!tap_tool(s, 3))
+			return false;
+		loop_for(0.1);
+		grid = effect_grid(s);
+		if (!grid)
+			return false;
+	}
+	wait_for_grid(grid);
+
+	Elm_Object_Item *item = elm_gengrid_first_item_get(grid);
+	for (int i = 0; item && i < index; i++)
+		item = elm_gengrid_item_next_get(item);
+	if (!item)
+		return false;
+	bool horizontal = elm_gengrid_horizontal_get(grid);
+	Evas_Coord gx, gy, gw, gh;
+	evas_object_geometry_get(grid, &gx, &gy, &gw, &gh);
+	for (int swipes = 0; swipes < 20; swipes++) {
+		Evas_Coord ix = 0, iy = 0, iw = 0, ih = 0;
+		Evas_Object *track = elm_object_item_track(item);
+		if (track)
+			evas_object_geometry_get(track, &ix, &iy, &iw, &ih);
+		elm_object_item_untrack(item);
+		bool realized = track && iw > 0 && ih > 0;
+		if (realized && ix >= gx && iy >= gy && ix + iw <= gx + gw && iy + ih <= gy + gh) {
+			tap_at(s->win, ix + iw / 2, iy + ih / 2);
+			return true;
+		}
+
+		/* Swipe the item towards the middle, at most three quarters of the
+		 * grid at a time; an item not laid out yet lies beyond the last one
+		 * that is. */
+		int length = horizontal ? gw : gh;
+		int offset;
+		if (realized) {
+			offset = horizontal ? (ix + iw / 2) - (gx + gw / 2) : (iy + ih / 2) - (gy + gh / 2);
+		} else {
+			Eina_List *shown = elm_gengrid_realized_items_get(grid);
+			int first_shown = -1, i = 0;
+			for (Elm_Object_Item *it = elm_gengrid_first_item_get(grid); it && first_shown < 0;
+			     it = elm_gengrid_item_next_get(it), i++)
+				if (eina_list_data_find(shown, it))
+					first_shown = i;
+			eina_list_free(shown);
+			offset = index < first_shown ? -length : length;
+		}
+		offset = std::max(-length * 3 / 8, std::min(length * 3 / 8, offset / 2));
+		int cx = gx + gw / 2, cy = gy + gh / 2;
+		if (horizontal)
+			slide_at(s->win, cx + offset, cy, cx - offset, cy, 15, 30, true);
+		else
+			slide_at(s->win, cx, cy + offset, cx, cy - offset, 15, 30, true);
+		wait_for_grid(grid);
 	}
 	return false;
 }
@@ -200,6 +309,26 @@ bool pinch_picture(Demo_Script *s, const std::string &arg)
 	return true;
 }
 
+/* A finger over the picture moved `dx` pixels sideways, a pixel or so per
+ * move as a real finger reports it. */
+bool drag_intensity(Demo_Script *s, const std::string &arg)
+{
+	char *end = nullptr;
+	long dx = strtol(arg.c_str(), &end, 10);
+	if (arg.empty() || *end) {
+		fprintf(stderr, "ie-demo-host: intensity needs a whole number of pixels, not '%s'\n", arg.c_str());
+		return false;
+	}
+	Evas_Object *area = evas_object_name_find(evas_object_evas_get(s->win), "effect_touch_layout");
+	if (!area || !evas_object_visible_get(area))
+		return false;
+	Evas_Coord x, y, w, h;
+	evas_object_geometry_get(area, &x, &y, &w, &h);
+	int x0 = x + w / 2 - int(dx) / 2, cy = y + h / 2;
+	slide_at(s->win, x0, cy, x0 + int(dx), cy, std::max(1, int(std::labs(dx)) / 2), 10, false);
+	return true;
+}
+
 /* An action is NAME or NAME:ARGUMENT; `arg` is the text after the colon
  * ("" without one). */
 struct Action {
@@ -211,7 +340,9 @@ constexpr Action actions_table[] = {
 	{"crop", [](Demo_Script *s, const std::string &) { return tap_tool(s, 0); }},
 	{"rotate-left", [](Demo_Script *s, const std::string &) { return tap_tool(s, 1); }},
 	{"rotate-right", [](Demo_Script *s, const std::string &) { return tap_tool(s, 2); }},
-	{"effect", [](Demo_Script *s, const std::string &) { return tap_tool(s, 3); }},
+	{"effect",
+	 [](Demo_Script *s, const std::string &arg) { return arg.empty() ? tap_tool(s, 3) : tap_effect(s, arg); }},
+	{"intensity", [](Demo_Script *s, const std::string &arg) { return drag_intensity(s, arg); }},
 	{"cancel", [](Demo_Script *s, const std::string &) { return tap_funcbar_button(s, "title_left_text_btn"); }},
 	{"done", [](Demo_Script *s, const std::string &) { return tap_funcbar_button(s, "title_right_text_btn"); }},
 	{"discard", [](Demo_Script *s, const std::string &) { return tap_popup_button(s, "deletepopup", "button2"); }},
@@ -250,12 +381,14 @@ bool picture_ready(Demo_Script *s)
 
 const char *demo_actions_help(void)
 {
-	return "crop rotate-left rotate-right effect cancel done discard keep storage-ok back "
+	return "crop rotate-left rotate-right effect effect:NAME intensity:DX cancel done discard keep storage-ok back "
 	       "drag:PART:DX:DY pinch:FACTOR";
 }
 
 bool demo_script_run(Demo_Script *s, const std::vector<std::string> &actions)
 {
+	/* The script plays a touch screen: lists scroll under a dragging finger. */
+	elm_config_scroll_thumbscroll_enabled_set(EINA_TRUE);
 	for (int tries = 0; tries < 200 && !picture_ready(s); tries++)
 		loop_for(0.05);
 	loop_for(0.1);

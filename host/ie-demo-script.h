@@ -1,5 +1,6 @@
 /* Scripted use of the editor through its real widgets: each action taps a
- * tool, a function-bar button or a popup button where it is on screen, or
+ * tool, an effect thumbnail, a function-bar button or a popup button where
+ * it is on screen, drags a finger over the picture or the effect strip, or
  * presses a key, then lets the main loop run. */
 #ifndef IE_DEMO_SCRIPT_H
 #define IE_DEMO_SCRIPT_H

@@ -10,6 +10,8 @@
 #include <fstream>
 #include <media_db.h>
 
+#include "ie-engine.h"
+
 #include "ie-test-harness.h"
 
 namespace {
@@ -127,6 +129,62 @@ TEST_F(Demo, CropDragAndDoneWriteTheCroppedPicture)
 	EXPECT_NE(status, 0) << output;
 	output = run_host(picture, "--do drag:inside:10:10", &status);
 	EXPECT_NE(status, 0) << output;
+}
+
+/* The README's example on the bundled picture: the saved file shows Sepia
+ * at the intensity the drag left, over the picture as the editor holds it
+ * (decoded and scaled by the engine to the window's size). */
+TEST_F(Demo, EffectAndIntensityThenDoneSaveTheBlendedEffect)
+{
+	std::string dir = iet::temp_dir();
+	std::string picture = dir + "/lake.jpg";
+	std::filesystem::copy_file(IE_SAMPLE_PICTURE, picture);
+	int status = 0;
+	std::string output = run_host(picture, "--do effect:sepia --do intensity:-120 --do done", &status);
+	ASSERT_EQ(status, 0) << output;
+	std::string path = saved_path(output);
+	ASSERT_EQ(path, dir + "/lake_e001.jpg") << output;
+
+	auto load = [this](const std::string &file, int *w, int *h) {
+		Evas_Object *image = evas_object_image_add(evas());
+		evas_object_image_file_set(image, file.c_str(), nullptr);
+		evas_object_image_size_get(image, w, h);
+		auto *data = static_cast<const uint32_t *>(evas_object_image_data_get(image, EINA_FALSE));
+		std::vector<uint32_t> pixels;
+		if (data)
+			pixels.assign(data, data + size_t(*w) * *h);
+		evas_object_del(image);
+		return pixels;
+	};
+	int sw = 0, sh = 0, w = 0, h = 0;
+	std::vector<uint32_t> source = load(picture, &sw, &sh);
+	std::vector<uint32_t> saved = load(path, &w, &h);
+	ASSERT_FALSE(source.empty());
+	ASSERT_EQ(w, 1280) << "the sample picture fitted to the 720 x 1280 window";
+	ASSERT_EQ(h, 960);
+
+	std::vector<uint32_t> unedited(saved.size()), sepia(saved.size());
+	IEL_Image full = {uint32_t(sw), uint32_t(sh), IEL_FORMAT_BGRA8888, reinterpret_cast<uint8_t *>(source.data())};
+	IEL_Image in = {uint32_t(w), uint32_t(h), IEL_FORMAT_BGRA8888, reinterpret_cast<uint8_t *>(unedited.data())};
+	ASSERT_EQ(IEL_Resize_Image(&full, &in), IEL_OK);
+	std::vector<uint32_t> expected = unedited;
+	IEL_Image out = {uint32_t(w), uint32_t(h), IEL_FORMAT_BGRA8888, reinterpret_cast<uint8_t *>(sepia.data())};
+	ASSERT_EQ(IEL_Run_Effect(&in, &out, IE_EFFECT_SEPIA), IEL_OK);
+	IEL_Image blended = {uint32_t(w), uint32_t(h), IEL_FORMAT_BGRA8888, reinterpret_cast<uint8_t *>(expected.data())};
+	ASSERT_EQ(IEL_Alpha_blending(&out, &blended, 70.0f), IEL_OK);
+
+	auto mean_difference = [](const std::vector<uint32_t> &a, const std::vector<uint32_t> &b) {
+		double total = 0;
+		for (size_t i = 0; i < a.size(); i++)
+			for (int shift = 0; shift < 24; shift += 8)
+				total += std::abs(int((a[i] >> shift) & 0xff) - int((b[i] >> shift) & 0xff));
+		return total / (a.size() * 3.0);
+	};
+	EXPECT_LT(mean_difference(saved, expected), 3.0) << "JPEG noise only";
+	EXPECT_GT(mean_difference(saved, unedited), 15.0) << "the effect shows";
+
+	Media_Db_Row row;
+	EXPECT_EQ(media_db_lookup(path.c_str(), &row), MEDIA_DB_ERROR_NONE);
 }
 
 TEST_F(Demo, ClosingWithoutDoneSavesNothing)

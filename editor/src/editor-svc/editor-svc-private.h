@@ -6,6 +6,7 @@
 #include <Elementary.h>
 #include <assist_theme.h>
 
+#include "IEL_Types.h"
 #include "editor-svc.h"
 #include "ie-config.h"
 #include "ie-debug.h"
@@ -65,6 +66,13 @@ struct _Viewhandle {
 	 * crop was ever applied to the picture. */
 	Ecore_Idler *crop_box_idler;
 	Eina_Bool cropped;
+
+	/* Effect view: its own idlers, and what ties the picture to the slider. */
+	Ecore_Idler *effect_update_idler;
+	Ecore_Idler *effect_grid_idler;
+	float effect_last_alpha;
+	int32_t effect_buf_row;
+	int32_t slider_drag_value;
 };
 
 /* editor-svc.cpp */
@@ -91,6 +99,34 @@ void _on_menu_done(void *data, Evas_Object *obj, void *event_info);
 void _popup_close(Viewhandle *vh);
 /* Done's crop: the picture replaced by its part under the selection box. */
 void __apply_crop(Viewhandle *vh);
+
+/* ie-effect-view.cpp, ie-effect-thumbnail.cpp: the data of one effect-grid
+ * item. */
+typedef struct {
+	Viewhandle *viewhandle;
+	int32_t index;
+} Ie_Data_Item;
+
+/* effect_last_alpha when nothing was blended since the last effect: the
+ * picture shows effect_buf as it is. */
+#define IE_EFFECT_NO_ALPHA (-1.0f)
+
+void SetThumbnailBuffer(Viewhandle *vh);
+Evas_Object *_effect_content_get(void *data, Evas_Object *obj, const char *part);
+char *_effect_text_get(void *data, Evas_Object *obj, const char *part);
+/* The full-size effect of `row` on the picture; false when it failed, the
+ * picture then left as it was found. */
+Eina_Bool generateEffect(Viewhandle *vh, int row);
+void generateEffectAlpha(Viewhandle *vh, float alpha);
+/* Schedules the scrolling of the effect grid to the picked item. */
+void ie_effect_grid_update_position_add(Viewhandle *vh);
+/* Removes the intensity drag's callbacks from the editor layout. */
+void ie_effect_touch_callbacks_del(Viewhandle *vh);
+/* A zero-filled pixel buffer of `bytes`, or NULL. */
+unsigned char *ie_effect_buffer_new(size_t bytes);
+/* Runs catalogue row `row`'s effect from `source` into the zero-filled
+ * `output` of the same size; false when the effect failed. */
+Eina_Bool ie_effect_run(IEL_Image *source, IEL_Image *output, int row);
 
 /* ie-log-manager.cpp */
 void *log_manager_create(void);

@@ -252,12 +252,13 @@ void IE_destroy(Viewhandle *vh)
 	/* Nothing deferred may run on the freed record: pending idlers go, and
 	 * an open view is closed while its objects still exist. A popup still up
 	 * goes first: deleted only with the layout, it is left registered with
-	 * the window's focus manager. */
+	 * the window's focus manager, and closed after the view it hands the
+	 * focus back to a widget of that view already deleted. */
 	ie_idlers_cancel(vh);
+	_popup_close(vh);
 	int view = ie_view_mgr_get_current_view();
 	if (view == IE_VIEW_TYPE_EFFECT || view == IE_VIEW_TYPE_CROP)
 		ie_view_mgr_set_view(IE_VIEW_TYPE_MAIN, vh);
-	_popup_close(vh);
 
 	if (vh->color_table) {
 		ea_theme_color_table_free(vh->color_table);

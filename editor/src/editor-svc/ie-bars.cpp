@@ -245,7 +245,10 @@ void ie_set_main_view_text(Viewhandle *vh)
 	if (vh->effect_layout) {
 		evas_object_del(vh->effect_layout);
 		vh->effect_layout = NULL;
+		/* The slider was the effect layout's content. */
+		vh->slider_layout = NULL;
 	}
+	ie_effect_touch_callbacks_del(vh);
 	elm_object_signal_emit(vh->layout, "elm,state,effect,view,hide", "elm");
 	if (vh->toolbar)
 		toolbar_orientation_apply(vh, ie_rotation_is_portrait(ie_window_rotation_get()), EINA_TRUE);
@@ -273,6 +276,7 @@ void _on_layout_resized(void *data, Evas *, Evas_Object *, void *)
 				elm_object_signal_emit(vh->slider_layout,
 						       portrait ? "elm,state,slider,default" : "elm,state,slider,landscape", "elm");
 		}
+		ie_effect_grid_update_position_add(vh);
 		ie_image_refit(vh->main_image);
 		break;
 	case IE_VIEW_TYPE_CROP:
