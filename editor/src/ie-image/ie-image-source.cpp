@@ -1,7 +1,7 @@
-/* Reads the picture file for the loader; see ie-image-source.h. Evas is
- * given the bytes read here, never the path: a name swapped between the
+/* Opens the picture file for the loader; see ie-image-source.h. Evas is
+ * given the file opened here, never the path: a name swapped between the
  * checks and the decoding could otherwise block the main loop on a FIFO or
- * get past the checks with other bytes. */
+ * get past the checks with another file. */
 #include "ie-image-source.h"
 
 #include <Evas.h>
@@ -11,10 +11,10 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <memory>
-#include <string>
 
 #include "editor-svc-private.h"
 
@@ -158,31 +158,6 @@ const char *errno_reason(int error)
 	}
 }
 
-/* The whole file through its descriptor; what it holds when read is what
- * counts, even if it grows or shrinks meanwhile. */
-bool read_all(int fd, size_t expected, std::unique_ptr<uint8_t[]> *bytes, size_t *size)
-{
-	std::unique_ptr<uint8_t[]> buf(new (std::nothrow) uint8_t[expected]);
-	if (!buf) {
-		errno = ENOMEM;
-		return false;
-	}
-	size_t got = 0;
-	while (got < expected) {
-		ssize_t n = read(fd, buf.get() + got, expected - got);
-		if (n < 0 && errno == EINTR)
-			continue;
-		if (n < 0)
-			return false;
-		if (n == 0)
-			break;
-		got += size_t(n);
-	}
-	*bytes = std::move(buf);
-	*size = got;
-	return true;
-}
-
 } // namespace
 
 Ie_Image_Facts ie_image_facts_get(const uint8_t *data, size_t size)
@@ -226,26 +201,35 @@ bool ie_image_source_open(const char *path, Ie_Image_Source *source)
 		return false;
 	}
 
-	std::unique_ptr<uint8_t[]> bytes;
-	size_t size = 0;
-	if (!read_all(fd.fd, size_t(st.st_size), &bytes, &size)) {
+	/* The descriptor's own link opens the very file checked above, whatever
+	 * has become of its name, without a copy of its bytes; only where /proc
+	 * is missing does the name serve. */
+	char link[sizeof("/proc/self/fd/") + 3 * sizeof(int)];
+	snprintf(link, sizeof(link), "/proc/self/fd/%d", fd.fd);
+	Eina_File *file = eina_file_open(link, EINA_FALSE);
+	if (!file)
+		file = eina_file_open(path, EINA_FALSE);
+	if (!file) {
 		log_refusal(errno_reason(errno));
 		return false;
 	}
-	Ie_Image_Facts facts = ie_image_facts_get(bytes.get(), size);
-	if (!facts.complete) {
-		log_refusal(evas_load_error_str(EVAS_LOAD_ERROR_CORRUPT_FILE));
-		return false;
-	}
 
-	/* Named after the path for the loader's choice by extension, but not
-	 * the path itself: nothing may take it for the file on disk. */
-	std::string name = std::string("ie-image-source:") + path;
-	source->file = eina_file_virtualize(name.c_str(), bytes.get(), size, EINA_TRUE);
-	if (!source->file) {
+	/* What the decoder will read is checked through the same map. */
+	const size_t size = eina_file_size_get(file);
+	const auto *data = static_cast<const uint8_t *>(eina_file_map_all(file, EINA_FILE_SEQUENTIAL));
+	if (!data) {
+		eina_file_close(file);
 		log_refusal(evas_load_error_str(EVAS_LOAD_ERROR_RESOURCE_ALLOCATION_FAILED));
 		return false;
 	}
+	Ie_Image_Facts facts = ie_image_facts_get(data, size);
+	eina_file_map_free(file, const_cast<uint8_t *>(data));
+	if (!facts.complete) {
+		eina_file_close(file);
+		log_refusal(evas_load_error_str(EVAS_LOAD_ERROR_CORRUPT_FILE));
+		return false;
+	}
+	source->file = file;
 	source->orientation = facts.orientation;
 	return true;
 }

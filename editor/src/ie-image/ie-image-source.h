@@ -1,8 +1,8 @@
 /* The picture file as the loader takes it: opened without blocking, refused
- * unless it is a regular file, read once into memory so that the bytes that
- * are checked are the bytes that are decoded, and looked over before any
- * decoding for what the decoder hides: a JPEG or PNG cut short, and the
- * EXIF orientation wherever its block sits. Internal to ie-image. */
+ * unless it is a regular file, handed to Evas as the file that was checked
+ * (never by its name again), and looked over before any decoding for what
+ * the decoder hides: a JPEG or PNG cut short, and the EXIF orientation
+ * wherever its block sits. Internal to ie-image. */
 #ifndef IE_IMAGE_SOURCE_H
 #define IE_IMAGE_SOURCE_H
 
@@ -12,7 +12,7 @@
 #include <cstdint>
 
 struct Ie_Image_Source {
-	/* The file's bytes for evas_object_image_mmap_set; Evas keeps its own
+	/* The file for evas_object_image_mmap_set; Evas keeps its own
 	 * references, so it may be closed once the images have it. */
 	Eina_File *file;
 	/* EXIF orientation, 1 to 8; 1 when the file has none. */
@@ -27,7 +27,7 @@ struct Ie_Image_Facts {
 	int orientation;
 };
 
-/* Reads `path` into `source`. A path that cannot be read, is not a regular
+/* Opens `path` into `source`. A path that cannot be read, is not a regular
  * file or holds a damaged picture logs one line and gives false. */
 bool ie_image_source_open(const char *path, Ie_Image_Source *source);
 void ie_image_source_close(Ie_Image_Source *source);
