@@ -39,6 +39,8 @@ struct Host {
 	Evas_Object *win = nullptr;
 	Viewhandle *editor = nullptr;
 	bool closed = false;
+	/* The editor closed before its picture ever showed. */
+	bool not_opened = false;
 	std::string saved_path;
 };
 
@@ -106,6 +108,18 @@ void headless_environment()
 	setenv("ELM_PROFILE_NOSAVE", "1", 0);
 }
 
+/* The editor's picture holds pixels: it has been on screen. */
+bool picture_shown(Evas_Object *win)
+{
+	Evas_Object *image = evas_object_name_find(evas_object_evas_get(win), "mImage");
+	int w = 0, h = 0;
+	if (image)
+		evas_object_image_size_get(image, &w, &h);
+	return w > 0 && h > 0 && evas_object_image_data_get(image, EINA_FALSE);
+}
+
+/* A null path before the picture ever showed is the only word the editor
+ * gives of a picture it could not open. */
 void on_delete_me(void *data, Evas_Object *, void *event_info)
 {
 	auto *host = static_cast<Host *>(data);
@@ -115,6 +129,9 @@ void on_delete_me(void *data, Evas_Object *, void *event_info)
 		host->saved_path = path;
 		printf("saved: %s\n", path);
 		free(path);
+	} else if (!picture_shown(host->win)) {
+		host->not_opened = true;
+		printf("closed: the picture could not be opened: %s; nothing saved\n", host->options.picture.c_str());
 	} else {
 		printf("closed: nothing saved\n");
 	}
@@ -187,11 +204,12 @@ int main(int argc, char **argv)
 	int status = 0;
 	if (o.headless) {
 		Demo_Script script = {host.win, view, &host.closed, o.shots_dir};
-		status = demo_script_run(&script, o.actions) ? 0 : 1;
-		if (demo_screenshot(host.win, o.screenshot.c_str()))
+		status = demo_script_run(&script, o.actions) && !host.not_opened ? 0 : 1;
+		if (!host.not_opened && demo_screenshot(host.win, o.screenshot.c_str()))
 			printf("screenshot: %s\n", o.screenshot.c_str());
 	} else {
 		elm_run();
+		status = host.not_opened ? 1 : 0;
 	}
 
 	IE_destroy(host.editor);

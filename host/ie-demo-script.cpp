@@ -392,6 +392,10 @@ bool demo_script_run(Demo_Script *s, const std::vector<std::string> &actions)
 	for (int tries = 0; tries < 200 && !picture_ready(s); tries++)
 		loop_for(0.05);
 	loop_for(0.1);
+	/* Closed before any step (a picture that could not be opened): the
+	 * host has said why; there is nothing to play. */
+	if (*s->closed)
+		return actions.empty();
 
 	int step = 0;
 	for (const auto &name : actions) {

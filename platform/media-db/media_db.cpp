@@ -1,5 +1,6 @@
 #include "media_db.h"
 
+#include <libexif/exif-data.h>
 #include <sqlite3.h>
 
 #include <cerrno>
@@ -60,33 +61,26 @@ bool read_exact(FILE *file, unsigned char *buf, size_t len)
 	return fread(buf, 1, len, file) == len;
 }
 
-// Orientation (tag 0x0112) of IFD0 in an EXIF block, 1 when absent or
-// unreadable.
+struct ExifUnref {
+	void operator()(ExifData *data) const { exif_data_unref(data); }
+};
+
+// Orientation (tag 0x0112) of IFD0 in an EXIF block, read with libexif as
+// written (no tags filled in); 1 when absent or unreadable.
 int exif_orientation(const unsigned char *exif, size_t len)
 {
-	if (len < 14 || memcmp(exif, "Exif\0\0", 6) != 0)
+	if (len < 6 || memcmp(exif, "Exif\0\0", 6) != 0)
 		return 1;
-	const unsigned char *tiff = exif + 6;
-	size_t tiff_len = len - 6;
-	bool little = memcmp(tiff, "II", 2) == 0;
-	if (!little && memcmp(tiff, "MM", 2) != 0)
+	std::unique_ptr<ExifData, ExifUnref> data(exif_data_new());
+	if (!data)
 		return 1;
-	auto u16 = [little](const unsigned char *p) { return little ? le16(p) : be16(p); };
-	auto u32 = [little](const unsigned char *p) { return little ? le32(p) : be32(p); };
-	uint32_t ifd = u32(tiff + 4);
-	if (ifd > tiff_len || tiff_len - ifd < 2)
+	exif_data_unset_option(data.get(), EXIF_DATA_OPTION_FOLLOW_SPECIFICATION);
+	exif_data_load_data(data.get(), exif, static_cast<unsigned int>(len));
+	ExifEntry *entry = exif_content_get_entry(data->ifd[EXIF_IFD_0], EXIF_TAG_ORIENTATION);
+	if (!entry || entry->format != EXIF_FORMAT_SHORT || entry->components < 1 || entry->size < 2)
 		return 1;
-	unsigned count = u16(tiff + ifd);
-	for (unsigned i = 0; i < count; i++) {
-		size_t entry = ifd + 2 + static_cast<size_t>(i) * 12;
-		if (entry + 12 > tiff_len)
-			return 1;
-		if (u16(tiff + entry) == 0x0112) {
-			int value = u16(tiff + entry + 8);
-			return (value >= 1 && value <= 8) ? value : 1;
-		}
-	}
-	return 1;
+	int value = exif_get_short(entry->data, exif_data_get_byte_order(data.get()));
+	return (value >= 1 && value <= 8) ? value : 1;
 }
 
 // Walks the marker segments up to the first frame header. Orientations
@@ -94,6 +88,7 @@ int exif_orientation(const unsigned char *exif, size_t len)
 Sniff sniff_jpeg(FILE *file, MediaInfo *info)
 {
 	int orientation = 1;
+	bool exif_seen = false; // the first EXIF block counts, wherever it sits
 	for (;;) {
 		int c = fgetc(file);
 		if (c != 0xFF)
@@ -130,10 +125,11 @@ Sniff sniff_jpeg(FILE *file, MediaInfo *info)
 			info->height = quarter_turn ? width : height;
 			return Sniff::media;
 		}
-		if (marker == 0xE1 && orientation == 1) {
+		if (marker == 0xE1 && !exif_seen) {
 			std::unique_ptr<unsigned char[]> app1(new unsigned char[body]);
 			if (!read_exact(file, app1.get(), body))
 				return Sniff::broken;
+			exif_seen = body >= 6 && memcmp(app1.get(), "Exif\0\0", 6) == 0;
 			orientation = exif_orientation(app1.get(), body);
 			continue;
 		}

@@ -13,6 +13,7 @@
 #include "ie-engine.h"
 
 #include "ie-test-harness.h"
+#include "ie-test-pictures.h"
 
 namespace {
 
@@ -185,6 +186,59 @@ TEST_F(Demo, EffectAndIntensityThenDoneSaveTheBlendedEffect)
 
 	Media_Db_Row row;
 	EXPECT_EQ(media_db_lookup(path.c_str(), &row), MEDIA_DB_ERROR_NONE);
+}
+
+/* Each EXIF orientation, with a comment before the EXIF block as common
+ * image editors write it: turned right and saved, the new file is the
+ * upright picture turned right, and its row says so. */
+class DemoOrientation : public Demo, public ::testing::WithParamInterface<int> {};
+
+TEST_P(DemoOrientation, TurnedRightAndSavedIsTheUprightPictureTurnedRight)
+{
+	const int orientation = GetParam();
+	std::string dir = iet::temp_dir();
+	std::string picture = dir + "/oriented.jpg";
+	ASSERT_TRUE(iet::write_oriented_jpeg(picture, 320, 240, orientation, orientation % 2 == 0, true));
+	int status = 0;
+	std::string output = run_host(picture, "--do rotate-right --do done", &status);
+	ASSERT_EQ(status, 0) << output;
+	std::string path = saved_path(output);
+	ASSERT_EQ(path, dir + "/oriented_e001.jpg") << output;
+
+	iet::Pixels saved = iet::stored_pixels(path);
+	const bool turned = orientation >= 5;
+	EXPECT_EQ(saved.w, turned ? 320 : 240);
+	EXPECT_EQ(saved.h, turned ? 240 : 320);
+	iet::Pixels want = iet::turned_upright(iet::turned_upright(iet::stored_pixels(picture), orientation), 6);
+	EXPECT_LE(iet::grid_difference(saved, want), 24);
+	Media_Db_Row row;
+	ASSERT_EQ(media_db_lookup(path.c_str(), &row), MEDIA_DB_ERROR_NONE);
+	EXPECT_EQ(row.width, saved.w);
+	EXPECT_EQ(row.height, saved.h);
+}
+
+INSTANTIATE_TEST_SUITE_P(Exif, DemoOrientation, ::testing::Range(1, 9));
+
+/* A JPEG cut short in its data: the editor closes before showing it, the
+ * host says the picture could not be opened, and nothing is written, not
+ * even the screenshot. */
+TEST_F(Demo, ACutPictureIsReportedAsNotOpenedAndNothingIsWritten)
+{
+	std::string dir = iet::temp_dir();
+	std::string picture = dir + "/cut.jpg";
+	ASSERT_TRUE(iet::write_picture(picture, 640, 480));
+	iet::Bytes bytes = iet::read_bytes(picture);
+	bytes.resize(bytes.size() * 3 / 5);
+	ASSERT_TRUE(iet::write_bytes(picture, bytes));
+	int status = 0;
+	std::string output = run_host(picture, "--do rotate-right --do done --screenshot " + dir + "/shot.png", &status);
+	EXPECT_NE(status, 0) << output;
+	EXPECT_NE(output.find("closed: the picture could not be opened: " + picture + "; nothing saved"), std::string::npos)
+		<< output;
+	EXPECT_EQ(output.find("saved: "), std::string::npos) << output;
+	EXPECT_EQ(output.find("cannot rotate-right"), std::string::npos) << output;
+	EXPECT_EQ(std::distance(std::filesystem::directory_iterator(dir), std::filesystem::directory_iterator()), 1)
+		<< "nothing written";
 }
 
 TEST_F(Demo, ClosingWithoutDoneSavesNothing)

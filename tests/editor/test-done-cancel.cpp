@@ -9,6 +9,7 @@
 #include "editor-fixture.h"
 #include "ie-image.h"
 #include "ie-save.h"
+#include "ie-test-pictures.h"
 
 namespace {
 
@@ -123,6 +124,40 @@ TEST_F(DoneCancel, DoneAfterARotationSavesBesideTheSource)
 	EXPECT_EQ(row.height, 64);
 }
 
+/* A picture stored turned or mirrored (a comment before its EXIF block),
+ * turned right and saved: the new file holds the upright picture turned
+ * right, at the size shown, whichever way it went in. */
+TEST_F(DoneCancel, DoneSavesAnOrientedPictureUprightOnEveryWayIn)
+{
+	/* In a 100 x 100 box: as is, resampled, and in the background. */
+	struct Way { const char *name; int w, h; bool reduced; };
+	for (const Way &way : { Way{ "as is", 64, 48, false }, Way{ "resampled", 240, 180, true },
+				Way{ "in the background", 360, 270, true } })
+		for (int orientation = 1; orientation <= 8; orientation++) {
+			SCOPED_TRACE(std::string(way.name) + ", orientation " + std::to_string(orientation));
+			std::string dir = iet::temp_dir(), path = dir + "/photo.jpg";
+			ASSERT_TRUE(iet::write_oriented_jpeg(path, way.w, way.h, orientation, orientation % 2 == 0, true));
+			close_requests.clear();
+			ASSERT_NE(create_editor(), nullptr);
+			IE_setparam(vh, path.c_str(), 100, 100, 0);
+			ASSERT_TRUE(iet::run_until([this] { return !iet::image_pixels(inner_image()).data.empty(); }));
+			iet::run_idlers();
+			ie_view_mgr_set_view(IE_VIEW_TYPE_ROTATE_RIGHT, vh);
+			tap_button(vh->done_btn);
+			ASSERT_EQ(close_requests.size(), 1u);
+			ASSERT_EQ(close_requests[0], dir + "/photo_e001.jpg");
+
+			iet::Pixels saved = iet::stored_pixels(close_requests[0]);
+			const bool turned = orientation >= 5;
+			const int long_side = way.reduced ? 100 : 64, short_side = way.reduced ? 75 : 48;
+			EXPECT_EQ(saved.w, turned ? long_side : short_side);
+			EXPECT_EQ(saved.h, turned ? short_side : long_side);
+			iet::Pixels want = iet::turned_upright(iet::turned_upright(iet::stored_pixels(path), orientation), 6);
+			EXPECT_LE(iet::grid_difference(saved, want), 24);
+			destroy_editor();
+		}
+}
+
 TEST_F(DoneCancel, DoneWithoutChangesStaysOpen)
 {
 	ASSERT_NE(open_editor_on_picture(64, 48), nullptr);
@@ -151,7 +186,8 @@ TEST_F(DoneCancel, DoneOnAFullStorageOffersTheStorageSettings)
 	mkdir(launchers.c_str(), 0755);
 	{
 		std::ofstream script(launchers + "/setting-storage-efl");
-		script << "#!/bin/sh\necho \"$@\" > " << marker << "\n";
+		/* Written aside and renamed, so the file is whole once it is there. */
+		script << "#!/bin/sh\necho \"$@\" > " << marker << ".part && mv " << marker << ".part " << marker << "\n";
 	}
 	chmod((launchers + "/setting-storage-efl").c_str(), 0755);
 

@@ -3,6 +3,7 @@
 
 #include "editor-fixture.h"
 #include "ie-image.h"
+#include "ie-test-pictures.h"
 
 namespace {
 
@@ -74,28 +75,39 @@ TEST_F(Shell, SetparamSwapsTheBoxForQuarterTurns)
 	}
 }
 
+/* Missing, or a JPEG cut short in its data (which the decoder would show
+ * with grey where the data is missing). */
 TEST_F(Shell, UnloadablePictureClosesOnceFromTheMainLoop)
 {
-	ASSERT_NE(create_editor(), nullptr);
 	std::string dir = iet::temp_dir();
-	IE_setparam(vh, (dir + "/missing.jpg").c_str(), 720, 1280, 0);
-	EXPECT_EQ(vh->main_image, nullptr);
-	EXPECT_TRUE(close_requests.empty()) << "the close request must wait for the main loop";
-	iet::run_idlers();
-	ASSERT_EQ(close_requests.size(), 1u);
-	EXPECT_EQ(close_requests[0], "");
-	destroy_editor();
-	iet::run_idlers();
-	EXPECT_EQ(close_requests.size(), 1u);
+	std::string cut = dir + "/cut.jpg";
+	ASSERT_TRUE(iet::write_picture(cut, 640, 480));
+	std::filesystem::resize_file(cut, std::filesystem::file_size(cut) * 3 / 4);
+	for (const std::string &path : { dir + "/missing.jpg", cut }) {
+		SCOPED_TRACE(path);
+		close_requests.clear();
+		ASSERT_NE(create_editor(), nullptr);
+		IE_setparam(vh, path.c_str(), 720, 1280, 0);
+		EXPECT_EQ(vh->main_image, nullptr);
+		EXPECT_TRUE(close_requests.empty()) << "the close request must wait for the main loop";
+		iet::run_idlers();
+		ASSERT_EQ(close_requests.size(), 1u);
+		EXPECT_EQ(close_requests[0], "");
+		destroy_editor();
+		iet::run_idlers();
+		EXPECT_EQ(close_requests.size(), 1u);
+	}
+	EXPECT_EQ(std::distance(std::filesystem::directory_iterator(dir), std::filesystem::directory_iterator()), 1)
+		<< "nothing written";
 }
 
 TEST_F(Shell, PictureFailingInTheBackgroundClosesOnce)
 {
 	ASSERT_NE(create_editor(), nullptr);
-	/* Large enough to be decoded in the background, cut in its pixels. */
+	/* Large enough to be decoded in the background, whole but short of
+	 * image data: only decoding finds that out. */
 	std::string path = iet::temp_dir() + "/damaged.png";
-	ASSERT_TRUE(iet::write_picture(path, 4000, 3000));
-	std::filesystem::resize_file(path, std::filesystem::file_size(path) / 2);
+	ASSERT_TRUE(iet::write_png_with_short_data(path, 4000, 3000));
 	evas_image_cache_flush(evas());
 	IE_setparam(vh, path.c_str(), 720, 1280, 0);
 	ASSERT_NE(vh->main_image, nullptr) << "the damage shows only once decoding runs";

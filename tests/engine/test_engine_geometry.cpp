@@ -39,6 +39,55 @@ TEST(EngineRotate, TurnsCopiesAndRefusals)
 	}
 }
 
+/* Each orientation written out on a 3 x 2 picture whose pixels hold their
+ * index (0 1 2 / 3 4 5), so that a swapped axis or direction shows. */
+TEST(EngineOrient, EachOrientationGivesTheUprightPicture)
+{
+	std::vector<uint32_t> pixels = {0, 1, 2, 3, 4, 5};
+	IEL_Image src = {3, 2, IEL_FORMAT_BGRA8888, reinterpret_cast<uint8_t *>(pixels.data())};
+	const std::vector<uint32_t> upright[9] = {{}, {0, 1, 2, 3, 4, 5}, {2, 1, 0, 5, 4, 3}, {5, 4, 3, 2, 1, 0},
+						  {3, 4, 5, 0, 1, 2}, {0, 3, 1, 4, 2, 5}, {3, 0, 4, 1, 5, 2},
+						  {5, 2, 4, 1, 3, 0}, {2, 5, 1, 4, 0, 3}};
+	for (unsigned int o = 1; o <= 8; o++) {
+		Picture out(3, 2);
+		ASSERT_EQ(IEL_Orient_Image(&src, &out.record, o), IEL_OK) << o;
+		std::vector<uint32_t> got(6);
+		std::memcpy(got.data(), out.data(), 24);
+		EXPECT_EQ(got, upright[o]) << o;
+		EXPECT_EQ(out.record.u32Width, o >= 5 ? 2u : 3u) << o;
+		EXPECT_EQ(out.record.u32Height, o >= 5 ? 3u : 2u) << o;
+		EXPECT_TRUE(out.guard_intact()) << o;
+	}
+
+	/* On pixels of 2, 3 and 4 bytes: 6 and 8 are the rotation's quarter
+	 * turns, and undoing each orientation gives the stored picture back. */
+	const unsigned int undo[9] = {0, 1, 2, 3, 4, 5, 8, 7, 6};
+	for (size_t b : {2, 3, 4}) {
+		const int format = b == 2 ? IEL_FORMAT_RGB565 : b == 3 ? IEL_FORMAT_RGB888 : IEL_FORMAT_BGRA8888;
+		Picture stored = random_picture(37, 19, b, format, b);
+		for (unsigned int o = 1; o <= 8; o++) {
+			Picture shown(37, 19, format, b), back(37, 19, format, b);
+			ASSERT_EQ(IEL_Orient_Image(&stored.record, &shown.record, o), IEL_OK);
+			if (o == 6 || o == 8) {
+				Picture turned(19, 37, format, b);
+				ASSERT_EQ(IEL_Rotate_Image(&stored.record, &turned.record, o == 6 ? 1 : 3), IEL_OK);
+				EXPECT_TRUE(turned.pixels() == shown.pixels()) << b << " bytes, " << o;
+			}
+			ASSERT_EQ(IEL_Orient_Image(&shown.record, &back.record, undo[o]), IEL_OK);
+			EXPECT_TRUE(back.pixels() == stored.pixels() && back.guard_intact() && back.record.u32Width == 37)
+				<< b << " bytes, " << o;
+		}
+	}
+
+	for (unsigned int o : {0u, 9u, static_cast<unsigned int>(-1)}) {
+		Picture refused(3, 5);
+		platform_log_record_clear();
+		EXPECT_EQ(IEL_Orient_Image(&src, &refused.record, o), IEL_ERR_INVALID_PARAM);
+		EXPECT_TRUE(refused.untouched() && refused.record.u32Width == 3);
+		EXPECT_EQ(only_message(), "Unknown orientation:" + std::to_string(int(o)) + " \n");
+	}
+}
+
 TEST(EngineResize, OwnSizeAndHalving)
 {
 	/* At its own size every output pixel is the mean of the 2 x 2 block
@@ -126,6 +175,7 @@ TEST(EngineRecords, EveryRoutineRefusesBadRecords)
 	struct Case { const char *name; Routine run; int null, no_pixels, empty, format, huge; };
 	const Case cases[] = {
 		{"rotate", [](auto *s, auto *d) { return IEL_Rotate_Image(s, d, 1); }, 1, 1, IEL_OK, -1, 3},
+		{"orient", [](auto *s, auto *d) { return IEL_Orient_Image(s, d, 7); }, 1, 1, IEL_OK, 4, 3},
 		{"resize", [](auto *s, auto *d) { return IEL_Resize_Image(s, d); }, 1, 1, 3, -1, 3},
 		{"crop", [](auto *s, auto *d) { return IEL_Crop_Image(s, d, 0, 0); }, 1, 1, 3, 4, 3},
 		{"blend", [](auto *s, auto *d) { return IEL_Alpha_blending(s, d, 50); }, 1, 1, 3, 4, 3},

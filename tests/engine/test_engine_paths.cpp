@@ -59,6 +59,21 @@ TEST(EnginePaths, FastPathsMatchTheirReference)
 		if (kAvx2)
 			paths.push_back({"avx2 rotation " + std::to_string(rot), reference, rotate(iel_rotate32_avx2)});
 	}
+	for (unsigned int o = 1; o <= 8; o++) {
+		auto to = o >= 5 ? +[](uint32_t w, uint32_t h) { return Size{h, w}; } : nullptr;
+		paths.push_back({"tiled orientation " + std::to_string(o),
+				 [o](const Input &in, uint8_t *out) { iel_orient_reference(in.src.data(), out, in.w, in.h, 4, o); },
+				 [o](const Input &in, uint8_t *out) { iel_orient32_tiled(words(in.src.data()), words(out), in.w, in.h, o); },
+				 1, to});
+		/* The routine itself, which hands the quarter turns to the rotation's paths. */
+		paths.push_back({"orientation " + std::to_string(o),
+				 [o](const Input &in, uint8_t *out) { iel_orient_reference(in.src.data(), out, in.w, in.h, 4, o); },
+				 [o](const Input &in, uint8_t *out) {
+					 IEL_Image dst = {0, 0, IEL_FORMAT_BGRA8888, out};
+					 ASSERT_EQ(IEL_Orient_Image(&in.src.record, &dst, o), IEL_OK);
+				 },
+				 1, to});
+	}
 	auto resize = [](decltype(&iel_resize_reference) fn) -> Fill {
 		return [fn](const Input &in, uint8_t *out) { fn(in.src.data(), in.w, in.h, out, in.to_w, in.to_h); };
 	};

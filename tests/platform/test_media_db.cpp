@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "ie-test-harness.h"
+#include "ie-test-pictures.h"
 
 namespace {
 
@@ -89,6 +90,13 @@ TEST_F(MediaContent, ScanRecordsTypeAndShownSizeFromTheContent)
 	scan_and_expect_row(jpg, "image/jpeg", 64, 48);
 	// Orientation 6 shows the picture a quarter turned.
 	scan_and_expect_row(turned, "image/jpeg", 48, 64);
+	// The EXIF block after a comment and in big-endian order is read too;
+	// only the first block counts.
+	std::string commented = dir + "/commented.jpg", two_blocks = dir + "/two-blocks.jpg";
+	ASSERT_TRUE(iet::write_oriented_jpeg(commented, 64, 48, 8, true, true));
+	scan_and_expect_row(commented, "image/jpeg", 48, 64);
+	write_file(two_blocks, iet::jpeg_with_segments(read_file(jpg), {iet::exif_segment(1, false), iet::exif_segment(6, true)}, true));
+	scan_and_expect_row(two_blocks, "image/jpeg", 64, 48);
 
 	// The name says PNG; on a rescan the new content decides.
 	write_file(png, jpeg_with_orientation(20, 10, 1));

@@ -52,6 +52,12 @@ void iel_rotate32_tiled(const uint32_t *src, uint32_t *dst, uint32_t width, uint
 void iel_rotate32_avx2(const uint32_t *src, uint32_t *dst, uint32_t width, uint32_t height,
 		       unsigned int rotation);
 
+/* Orientation (EXIF values 1 to 8, checked by the caller). */
+void iel_orient_reference(const uint8_t *src, uint8_t *dst, uint32_t width, uint32_t height,
+			  int bytes_per_pixel, unsigned int orientation);
+void iel_orient32_tiled(const uint32_t *src, uint32_t *dst, uint32_t width, uint32_t height,
+			unsigned int orientation);
+
 /* Resize of BGRA pictures (src at least 1 x 1). */
 void iel_resize_reference(const uint8_t *src, uint32_t src_width, uint32_t src_height,
 			  uint8_t *dst, uint32_t dst_width, uint32_t dst_height);

@@ -54,6 +54,8 @@ typedef struct {
 extern const Effect_Info effect_table[IE_EFFECT_TABLE_ROWS];
 
 int IEL_Rotate_Image(const IEL_Image *src, IEL_Image *dst, unsigned int rotation);
+/* The upright picture from one stored in EXIF orientation 1 to 8. */
+int IEL_Orient_Image(const IEL_Image *src, IEL_Image *dst, unsigned int orientation);
 int IEL_Resize_Image(const IEL_Image *src, IEL_Image *dst);
 uint32_t IEL_Bilinear_Sample(double x, double y, const uint32_t *src, int width);
 int IEL_Alpha_blending(const IEL_Image *effect, IEL_Image *inout, float alpha);

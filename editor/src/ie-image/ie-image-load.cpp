@@ -2,7 +2,10 @@
  * than the host's box is reduced so that its long side equals the box's
  * longer side: small reductions at once (decoder scale-down, then a
  * bilinear resample), large ones and GIF/WBMP in an offscreen buffer canvas
- * preloaded in the background while a processing popup shows. */
+ * preloaded in the background while a processing popup shows. The EXIF
+ * orientation is read from the file by us and applied to the pixels by us
+ * on every path, as they go into the image: Evas's own reading misses a
+ * block that another segment precedes. */
 #include <Ecore_Evas.h>
 #include <Elementary.h>
 
@@ -18,6 +21,7 @@
 #include "editor-svc-private.h"
 #include "ie-engine.h"
 #include "ie-image-private.h"
+#include "ie-image-source.h"
 
 namespace {
 
@@ -37,8 +41,14 @@ enum class Load_Path { FULL_SIZE, RESAMPLED, ASYNC };
 struct Load_Plan {
 	Load_Path path;
 	int scale_down; /* decoder scale-down factor, 0 for none */
-	int target_w, target_h;
+	int target_w, target_h; /* as shown upright */
+	int orientation;	/* EXIF, of the stored pixels */
 };
+
+/* EXIF orientation 1 stores the picture upright; 5 to 8 store it a quarter
+ * turned, its rows being the upright picture's columns. */
+constexpr int UPRIGHT = 1;
+constexpr int FIRST_TURNED_ORIENTATION = 5;
 
 struct Evas_Object_Deleter {
 	void operator()(Evas_Object *obj) const { evas_object_del(obj); }
@@ -48,6 +58,21 @@ using Evas_Object_Ptr = std::unique_ptr<Evas_Object, Evas_Object_Deleter>;
 struct Free_Deleter {
 	void operator()(void *p) const { free(p); }
 };
+
+/* Evas holds its own references to the file once the images have it. */
+struct Source_Closer {
+	Ie_Image_Source *source;
+	~Source_Closer() { ie_image_source_close(source); }
+};
+
+/* The size of a w x h picture seen the other way: as stored when w x h is
+ * upright, upright when it is as stored. */
+void turned_size(int orientation, int w, int h, int *turned_w, int *turned_h)
+{
+	const bool turned = orientation >= FIRST_TURNED_ORIENTATION;
+	*turned_w = turned ? h : w;
+	*turned_h = turned ? w : h;
+}
 
 } // namespace
 
@@ -65,7 +90,7 @@ static bool _load_plan_get(const char *path, int iw, int ih, int box_w, int box_
 		return false;
 
 	if ((int64_t)iw * ih <= (int64_t)box_w * box_h) {
-		*plan = { Load_Path::FULL_SIZE, 0, iw, ih };
+		*plan = { Load_Path::FULL_SIZE, 0, iw, ih, UPRIGHT };
 		return true;
 	}
 
@@ -127,29 +152,83 @@ static const void *_image_pixels_decode(Evas_Object *image)
 	return pixels;
 }
 
-static bool _load_full_size(Mainimg_Smart_Data *sd, const char *path, const Load_Plan &plan)
+/* The picture's bytes, with Evas's orientation reading off: the
+ * orientation is ours to apply. */
+static void _image_source_set(Evas_Object *image, const Ie_Image_Source &source)
 {
-	evas_object_image_load_orientation_set(sd->image, EINA_TRUE);
-	evas_object_image_file_set(sd->image, path, NULL);
-	const void *pixels = _image_pixels_decode(sd->image);
-	if (!pixels) {
-		evas_object_image_file_set(sd->image, NULL, NULL);
+	evas_object_image_load_orientation_set(image, EINA_FALSE);
+	evas_object_image_mmap_set(image, source.file, NULL);
+}
+
+/* Replaces what `image` holds with `pixels` (w x h as stored) turned
+ * upright: the turn writes straight into the image's own buffer, so putting
+ * the pixels in place costs no more than the copy it replaces. On failure
+ * the image is left empty. */
+static bool _image_pixels_put(Evas_Object *image, const void *pixels, int w, int h, int orientation,
+			      Eina_Bool alpha)
+{
+	int upright_w, upright_h;
+	turned_size(orientation, w, h, &upright_w, &upright_h);
+	evas_object_image_file_set(image, NULL, NULL);
+	evas_object_image_alpha_set(image, alpha);
+	evas_object_image_size_set(image, upright_w, upright_h);
+	/* The rest of the editor takes rows as packed. */
+	void *dst = NULL;
+	if (evas_object_image_stride_get(image) == upright_w * 4)
+		dst = evas_object_image_data_get(image, EINA_TRUE);
+	if (!dst) {
+		IE_LOG_E("Cannot hold a %dx%d picture", upright_w, upright_h);
+		evas_object_image_data_set(image, NULL);
 		return false;
 	}
-	/* Read-only access ends here; Evas keeps the decoded pixels. */
-	evas_object_image_data_set(sd->image, const_cast<void *>(pixels));
+	IEL_Image from = { (uint32_t)w, (uint32_t)h, IEL_FORMAT_BGRA8888,
+			   static_cast<uint8_t *>(const_cast<void *>(pixels)) };
+	IEL_Image to = { 0, 0, IEL_FORMAT_BGRA8888, static_cast<uint8_t *>(dst) };
+	int result = IEL_Orient_Image(&from, &to, (unsigned int)orientation);
+	evas_object_image_data_set(image, dst);
+	if (result != IEL_OK) {
+		IE_LOG_E("IEL_Orient_Image failed (%d)", result);
+		evas_object_image_data_set(image, NULL);
+		return false;
+	}
+	evas_object_image_data_update_add(image, 0, 0, upright_w, upright_h);
+	return true;
+}
+
+/* Upright as stored: the image keeps the file and decodes it in place.
+ * Otherwise the probe decodes it and the turn puts it into the image. */
+static bool _load_full_size(Mainimg_Smart_Data *sd, Evas_Object *probe, const Ie_Image_Source &source,
+			    const Load_Plan &plan)
+{
+	if (plan.orientation == UPRIGHT) {
+		_image_source_set(sd->image, source);
+		const void *pixels = _image_pixels_decode(sd->image);
+		if (!pixels) {
+			evas_object_image_file_set(sd->image, NULL, NULL);
+			return false;
+		}
+		/* Read-only access ends here; Evas keeps the decoded pixels. */
+		evas_object_image_data_set(sd->image, const_cast<void *>(pixels));
+	} else {
+		const void *pixels = _image_pixels_decode(probe);
+		int sw = 0, sh = 0;
+		evas_object_image_size_get(probe, &sw, &sh);
+		if (!pixels || !_image_pixels_put(sd->image, pixels, sw, sh, plan.orientation,
+						  evas_object_image_alpha_get(probe)))
+			return false;
+	}
 	sd->img_w = plan.target_w;
 	sd->img_h = plan.target_h;
 	return true;
 }
 
-static bool _load_resampled(Mainimg_Smart_Data *sd, const char *path, const Load_Plan &plan)
+/* Resampled as stored, then turned upright on the way into the image. */
+static bool _load_resampled(Mainimg_Smart_Data *sd, const Ie_Image_Source &source, const Load_Plan &plan)
 {
 	Evas_Object *image = sd->image;
-	evas_object_image_load_orientation_set(image, EINA_TRUE);
 	/* Load options go before the file, so the header is read only once. */
 	evas_object_image_load_scale_down_set(image, plan.scale_down);
-	evas_object_image_file_set(image, path, NULL);
+	_image_source_set(image, source);
 
 	const void *pixels = _image_pixels_decode(image);
 	int sw = 0, sh = 0;
@@ -159,9 +238,11 @@ static bool _load_resampled(Mainimg_Smart_Data *sd, const char *path, const Load
 		return false;
 	}
 
+	int stored_w, stored_h;
+	turned_size(plan.orientation, plan.target_w, plan.target_h, &stored_w, &stored_h);
 	size_t bytes = 0;
 	std::unique_ptr<uint8_t, Free_Deleter> buf;
-	if (!__builtin_mul_overflow((size_t)plan.target_w * (size_t)plan.target_h, (size_t)4, &bytes))
+	if (!__builtin_mul_overflow((size_t)stored_w * (size_t)stored_h, (size_t)4, &bytes))
 		buf.reset(static_cast<uint8_t *>(calloc(1, bytes)));
 	if (!buf) {
 		IE_LOG_E("inter.pbBuf is null ,Calloc failed");
@@ -171,7 +252,7 @@ static bool _load_resampled(Mainimg_Smart_Data *sd, const char *path, const Load
 
 	IEL_Image src = { (uint32_t)sw, (uint32_t)sh, IEL_FORMAT_BGRA8888,
 			  static_cast<uint8_t *>(const_cast<void *>(pixels)) };
-	IEL_Image inter = { (uint32_t)plan.target_w, (uint32_t)plan.target_h, IEL_FORMAT_BGRA8888, buf.get() };
+	IEL_Image inter = { (uint32_t)stored_w, (uint32_t)stored_h, IEL_FORMAT_BGRA8888, buf.get() };
 	int result = IEL_Resize_Image(&src, &inter);
 	if (result != IEL_OK) {
 		IE_LOG_E("IEL_Resize_Image failed (%d)", result);
@@ -181,11 +262,9 @@ static bool _load_resampled(Mainimg_Smart_Data *sd, const char *path, const Load
 
 	/* From here the pixels are ours, not the file's: Evas must never reload
 	 * the full-size file over them. */
-	Eina_Bool alpha = evas_object_image_alpha_get(image);
-	evas_object_image_file_set(image, NULL, NULL);
-	evas_object_image_alpha_set(image, alpha);
-	evas_object_image_size_set(image, plan.target_w, plan.target_h);
-	evas_object_image_data_copy_set(image, buf.get());
+	if (!_image_pixels_put(image, buf.get(), stored_w, stored_h, plan.orientation,
+			       evas_object_image_alpha_get(image)))
+		return false;
 	sd->img_w = plan.target_w;
 	sd->img_h = plan.target_h;
 	return true;
@@ -309,13 +388,13 @@ static void _on_image_preloaded(void *data, Evas *e, Evas_Object *preload_image,
 		Ecore_Evas *ee = ecore_evas_object_ecore_evas_get(preload_image);
 		evas_object_show(preload_image);
 		const void *pixels = ee ? ecore_evas_buffer_pixels_get(ee) : NULL;
-		int tw = (int)(intptr_t)evas_object_data_get(preload_image, PRELOAD_WIDTH_KEY);
-		int th = (int)(intptr_t)evas_object_data_get(preload_image, PRELOAD_HEIGHT_KEY);
-		if (pixels) {
-			evas_object_image_size_set(sd->image, tw, th);
-			evas_object_image_data_copy_set(sd->image, const_cast<void *>(pixels));
-		} else {
+		int pw = (int)(intptr_t)evas_object_data_get(preload_image, PRELOAD_WIDTH_KEY);
+		int ph = (int)(intptr_t)evas_object_data_get(preload_image, PRELOAD_HEIGHT_KEY);
+		if (!pixels) {
 			IE_LOG_E("offscreen canvas gave no pixels");
+			failed = true;
+		} else if (!_image_pixels_put(sd->image, pixels, pw, ph, sd->orientation,
+					      evas_object_image_alpha_get(sd->image))) {
 			failed = true;
 		}
 	}
@@ -336,9 +415,12 @@ static void _on_image_preloaded(void *data, Evas *e, Evas_Object *preload_image,
 		sd->load_failed_job = ecore_job_add(_load_failed_job_cb, sd->obj);
 }
 
-static bool _load_async(Mainimg_Smart_Data *sd, const char *path, const Load_Plan &plan)
+/* The offscreen canvas renders the picture as stored, at the target size;
+ * the preload notice turns it upright on the way into the image. */
+static bool _load_async(Mainimg_Smart_Data *sd, const Ie_Image_Source &source, const Load_Plan &plan)
 {
-	const int tw = plan.target_w, th = plan.target_h;
+	int tw, th;
+	turned_size(plan.orientation, plan.target_w, plan.target_h, &tw, &th);
 	/* The canvas only ever renders the target size: no need for a
 	 * full-size buffer first. */
 	Ecore_Evas *ee = ecore_evas_buffer_new(tw, th);
@@ -354,13 +436,13 @@ static bool _load_async(Mainimg_Smart_Data *sd, const char *path, const Load_Pla
 	}
 	sd->preload_image = preload_image;
 	sd->preloaded = EINA_FALSE;
-	evas_object_image_load_orientation_set(preload_image, EINA_TRUE);
+	sd->orientation = plan.orientation;
 	evas_object_data_set(preload_image, PRELOAD_EE_KEY, ee);
 	evas_object_event_callback_add(preload_image, EVAS_CALLBACK_IMAGE_PRELOADED, _on_image_preloaded, sd->obj);
 
 	if (plan.scale_down > 0)
 		evas_object_image_load_scale_down_set(preload_image, plan.scale_down);
-	evas_object_image_file_set(preload_image, path, NULL);
+	_image_source_set(preload_image, source);
 	Evas_Load_Error error = evas_object_image_load_error_get(preload_image);
 	if (error != EVAS_LOAD_ERROR_NONE)
 		_print_image_load_err(error);
@@ -384,8 +466,8 @@ static bool _load_async(Mainimg_Smart_Data *sd, const char *path, const Load_Pla
 	else
 		sd->processing_popup = _processing_popup_create(sd);
 
-	sd->img_w = tw;
-	sd->img_h = th;
+	sd->img_w = plan.target_w;
+	sd->img_h = plan.target_h;
 	return true;
 }
 
@@ -406,37 +488,44 @@ Eina_Bool ie_image_file_load(Evas_Object *obj, const char *path, int width, int 
 	_preload_release(sd);
 	_processing_popup_del(sd);
 
+	Ie_Image_Source source;
+	if (!ie_image_source_open(path, &source))
+		return EINA_FALSE;
+	Source_Closer source_closer{ &source };
+
 	Evas_Object_Ptr probe(evas_object_image_add(evas_object_evas_get(obj)));
 	if (!probe) {
 		IE_LOG_E("Cannot create probe image");
 		return EINA_FALSE;
 	}
-	evas_object_image_load_orientation_set(probe.get(), EINA_TRUE);
-	evas_object_image_file_set(probe.get(), path, NULL);
+	_image_source_set(probe.get(), source);
 	Evas_Load_Error error = evas_object_image_load_error_get(probe.get());
 	if (error != EVAS_LOAD_ERROR_NONE) {
 		_print_image_load_err(error);
 		return EINA_FALSE;
 	}
 
-	int iw = 0, ih = 0;
-	evas_object_image_size_get(probe.get(), &iw, &ih);
-	Load_Plan plan;
+	/* Sizes and steps go by the picture as shown upright. */
+	int sw = 0, sh = 0, iw, ih;
+	evas_object_image_size_get(probe.get(), &sw, &sh);
+	turned_size(source.orientation, sw, sh, &iw, &ih);
+	Load_Plan plan = {};
 	if (!_load_plan_get(path, iw, ih, width, height, &plan)) {
 		IE_LOG_E("Cannot hold a %dx%d picture in a %dx%d box", iw, ih, width, height);
 		return EINA_FALSE;
 	}
+	plan.orientation = source.orientation;
 
 	bool ok = false;
 	switch (plan.path) {
 	case Load_Path::FULL_SIZE:
-		ok = _load_full_size(sd, path, plan);
+		ok = _load_full_size(sd, probe.get(), source, plan);
 		break;
 	case Load_Path::RESAMPLED:
-		ok = _load_resampled(sd, path, plan);
+		ok = _load_resampled(sd, source, plan);
 		break;
 	case Load_Path::ASYNC:
-		ok = _load_async(sd, path, plan);
+		ok = _load_async(sd, source, plan);
 		break;
 	}
 	if (!ok)

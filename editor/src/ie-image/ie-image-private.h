@@ -35,6 +35,9 @@ typedef struct {
 	 * the owner may delete the object, and with it the offscreen canvas
 	 * that is still delivering that notice. */
 	Ecore_Job *load_failed_job;
+	/* EXIF orientation of the picture being loaded in the background; its
+	 * pixels are turned upright as they arrive. */
+	int orientation;
 } Mainimg_Smart_Data;
 
 /* The record of a main image object, or NULL for any other object. */
