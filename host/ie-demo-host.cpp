@@ -15,6 +15,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
 #include <string>
 #include <vector>
 
@@ -44,13 +45,15 @@ struct Host {
 	std::string saved_path;
 };
 
-void usage()
+/* Installed, the demo goes by another name than in the build tree. */
+void usage(const char *program)
 {
+	const char *slash = strrchr(program, '/');
 	fprintf(stderr,
-		"usage: ie-demo-host [picture] [--headless] [--size WxH] [--rotation DEG]\n"
-		"                    [--do ACTION]... [--screenshot PATH] [--shots DIR]\n"
+		"usage: %s [picture] [--headless] [--size WxH] [--rotation DEG]\n"
+		"       [--do ACTION]... [--screenshot PATH] [--shots DIR]\n"
 		"actions: %s\n",
-		demo_actions_help());
+		slash ? slash + 1 : program, demo_actions_help());
 }
 
 bool parse(int argc, char **argv, Options *o)
@@ -86,11 +89,33 @@ bool parse(int argc, char **argv, Options *o)
 	return true;
 }
 
+/* The demo's own data (platform databases, default screenshot): inside the
+ * build tree, or, installed, in the user's data directory, since the
+ * system's directories are not the user's to write. */
+const std::string &demo_data_dir()
+{
+	static const std::string dir = [] {
+#ifdef IE_DEMO_DATA_DIR
+		std::string path = IE_DEMO_DATA_DIR;
+#else
+		const char *data_home = getenv("XDG_DATA_HOME");
+		const char *home = getenv("HOME");
+		std::string path = data_home && *data_home ? std::string(data_home)
+			: std::string(home && *home ? home : "/tmp") + "/.local/share";
+		path += "/editor-svc-demo";
+#endif
+		std::error_code ignored;
+		std::filesystem::create_directories(path, ignored);
+		return path;
+	}();
+	return dir;
+}
+
 /* Where the platform services keep their data when the caller said nothing:
- * beside the demo, not in the system's directories. */
+ * in the demo's data directory, not in the system's directories. */
 void default_platform_paths()
 {
-	static const std::string data_dir = std::string(IE_DEMO_DATA_DIR);
+	const std::string &data_dir = demo_data_dir();
 	setenv("MEDIA_DB_PATH", (data_dir + "/media.db").c_str(), 0);
 	setenv("VANTRIC_LOG_DB", (data_dir + "/vantric-log.db").c_str(), 0);
 	setenv("STORAGE_INTERNAL_ROOT", "/", 0);
@@ -151,7 +176,7 @@ int main(int argc, char **argv)
 {
 	Host host;
 	if (!parse(argc, argv, &host.options)) {
-		usage();
+		usage(argv[0]);
 		return 2;
 	}
 	Options &o = host.options;
@@ -162,7 +187,7 @@ int main(int argc, char **argv)
 	if (o.headless) {
 		headless_environment();
 		if (o.screenshot.empty())
-			o.screenshot = std::string(IE_DEMO_DATA_DIR) + "/editor.png";
+			o.screenshot = demo_data_dir() + "/editor.png";
 	}
 	default_platform_paths();
 	// gettext ignores catalogues in the C locale.
