@@ -1,9 +1,13 @@
 /* End to end: the demo host drives the real editor with taps on its real
  * widgets, as a person would, and the saved file is checked on disk and in
  * the media database. */
+#include <sys/mount.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
+#include <cerrno>
 #include <cstdio>
+#include <cstring>
 #include <fstream>
 #include <media_db.h>
 
@@ -101,6 +105,30 @@ TEST_F(Demo, HeadlessRunWritesAScreenshot)
 	EXPECT_EQ(w, 720);
 	EXPECT_EQ(h, 1280);
 	evas_object_del(check);
+}
+
+/* A save that fails keeps the editor open with its popup; its OK closes
+ * only the popup. */
+TEST_F(Demo, ASaveThatFailsKeepsTheEditorOpen)
+{
+	if (geteuid() != 0)
+		GTEST_SKIP() << "a read-only folder needs a mount, which needs root";
+	std::string dir = iet::temp_dir();
+	if (mount("tmpfs", dir.c_str(), "tmpfs", 0, "size=4m") != 0)
+		GTEST_SKIP() << "cannot mount a tmpfs here: " << strerror(errno);
+	std::string picture = dir + "/a.jpg";
+	bool written = iet::write_picture(picture, 320, 240);
+	bool read_only = mount(nullptr, dir.c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr) == 0;
+	int status = 0;
+	std::string output = written && read_only
+		? run_host(picture, "--do rotate-right --do done --do failed-ok --do cancel --do discard", &status)
+		: std::string();
+	umount2(dir.c_str(), MNT_DETACH);
+	ASSERT_TRUE(written && read_only);
+	EXPECT_EQ(status, 0) << output;
+	EXPECT_NE(output.find("step 3: failed-ok"), std::string::npos) << output;
+	EXPECT_NE(output.find("closed: nothing saved"), std::string::npos) << output;
+	EXPECT_EQ(output.find("saved: "), std::string::npos) << output;
 }
 
 } // namespace

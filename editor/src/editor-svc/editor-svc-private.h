@@ -61,6 +61,11 @@ struct _Viewhandle {
 	int32_t win_rotation;
 	Assist_Font_Table *font_table;
 	void *log_handle;
+	/* Save (ie-menu.cpp): the registration of the saved file still running
+	 * after Done, and the processing popup shown when it takes a while. */
+	struct _Ie_Save_Registration *save_registration;
+	Ecore_Timer *save_popup_timer;
+	Evas_Object *save_popup;
 };
 
 /* editor-svc.cpp */
@@ -85,6 +90,9 @@ void _on_layout_resized(void *data, Evas *e, Evas_Object *obj, void *event_info)
 void _on_menu_cancel(void *data, Evas_Object *obj, void *event_info);
 void _on_menu_done(void *data, Evas_Object *obj, void *event_info);
 void _popup_close(Viewhandle *vh);
+/* Forgets a save still registering, for IE_destroy: nothing of it runs on
+ * the freed record. */
+void _save_flow_release(Viewhandle *vh);
 
 /* ie-crop-view.cpp: the selection rectangle in canvas coordinates, while
  * the crop view shows one. */

@@ -254,6 +254,7 @@ void IE_destroy(Viewhandle *vh)
 	 * goes first: deleted only with the layout, it is left registered with
 	 * the window's focus manager. */
 	ie_idlers_cancel(vh);
+	_save_flow_release(vh);
 	int view = ie_view_mgr_get_current_view();
 	if (view == IE_VIEW_TYPE_EFFECT || view == IE_VIEW_TYPE_CROP)
 		ie_view_mgr_set_view(IE_VIEW_TYPE_MAIN, vh);

@@ -9,6 +9,9 @@
 #define IE_SAVE_SDCARD_ROOT "/opt/storage/sdcard"
 /* A full-size JPEG needs about this much room. */
 #define IE_SAVE_MIN_FREE_BYTES 1242880ULL
+/* A save works in a private directory of this name plus 12 letters or
+ * digits, made in the destination folder and removed afterwards. */
+#define IE_SAVE_WORK_DIR_PREFIX ".ie-save-"
 
 #ifdef __cplusplus
 extern "C" {

@@ -1,20 +1,32 @@
-/* Saving the edited picture as a new JPEG beside the source. The picture is
- * written to a temporary file in the destination directory, flushed, and
- * only then published under its name, never replacing a file already
- * there: a failed save leaves the directory as it was and the source is
- * never touched. */
+/* Saving the edited picture as a new JPEG beside the source.
+ *
+ * Other users may write to the destination folder, so once a save starts
+ * nothing is reached through a name they could swap: the picture is written
+ * in a private directory (mode 0700) made inside that folder and reached
+ * through its descriptor, flushed, published under its name with a rename
+ * that never replaces an existing entry, and checked to be the file that was
+ * written. The private directory is locked while in use; one left behind by
+ * a process that died is removed by the next save in the folder. A failed
+ * save leaves the folder as it was, and the source is never touched. */
 #include "ie-save.h"
 #include "ie-save-private.h"
 
+#include <Ecore.h>
 #include <Ecore_File.h>
 
+#include <algorithm>
 #include <cerrno>
-#include <cinttypes>
+#include <climits>
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <ctime>
+#include <dirent.h>
 #include <fcntl.h>
 #include <memory>
+#include <string>
+#include <sys/file.h>
 #include <sys/random.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -31,12 +43,13 @@ constexpr int FIRST_COUNTER = 1;
 constexpr int LAST_COUNTER = 998;
 /* Stripped names this long are cut so the suffix still fits a file name. */
 constexpr size_t LONG_NAME_LEN = 240;
-constexpr size_t LONG_NAME_LIMIT = 235;
-constexpr size_t SHORT_NAME_LIMIT = 256;
+constexpr size_t LONG_NAME_CUT = 234;
 constexpr char SAVE_EXT[] = ".jpg";
-/* Room for the temporary name ".ie-save-XXXXXXXX.jpg" after the directory. */
-constexpr size_t TEMP_PATH_LEN = SAVE_BUF_LEN + 32;
-constexpr int TEMP_ATTEMPTS = 64;
+constexpr int WORK_DIR_ATTEMPTS = 64;
+constexpr size_t WORK_DIR_RANDOM_LEN = 12;
+constexpr char WORK_DIR_ALPHABET[] = "abcdefghijklmnopqrstuvwxyz0123456789";
+/* Inside the private directory: what the encoder wrote. */
+constexpr char WORK_PICTURE[] = "picture.jpg";
 
 char save_dir[SAVE_BUF_LEN];
 char save_name[SAVE_BUF_LEN];
@@ -51,6 +64,25 @@ struct FreeDeleter {
 	void operator()(void *ptr) const { free(ptr); }
 };
 using CString = std::unique_ptr<char, FreeDeleter>;
+
+class Fd {
+public:
+	explicit Fd(int fd = -1) : fd_(fd) {}
+	Fd(const Fd &) = delete;
+	Fd &operator=(const Fd &) = delete;
+	~Fd() { reset(); }
+	int get() const { return fd_; }
+	explicit operator bool() const { return fd_ >= 0; }
+	void reset(int fd = -1)
+	{
+		if (fd_ >= 0)
+			close(fd_);
+		fd_ = fd;
+	}
+
+private:
+	int fd_;
+};
 
 /* Formats "<stem>_eNNN" into `name`; false when it does not fit. */
 bool _save_format_name(char *name, size_t size, const char *stem, int counter)
@@ -85,6 +117,18 @@ void _save_clear_choice(void)
 	save_counter = 0;
 }
 
+/* Length of `name` cut to at most `limit` bytes without splitting a UTF-8
+ * character: a file name must stay valid text. */
+size_t _save_utf8_cut(const char *name, size_t limit)
+{
+	size_t len = strlen(name);
+	if (len <= limit)
+		return len;
+	while (limit > 0 && (static_cast<unsigned char>(name[limit]) & 0xC0) == 0x80)
+		limit--;
+	return limit;
+}
+
 /* Searches the first free counter for the source's name and keeps the stem
  * for later searches. Returns the chosen name, or NULL. */
 char *_save_get_filename_from_fullpath(const char *filepath)
@@ -95,20 +139,24 @@ char *_save_get_filename_from_fullpath(const char *filepath)
 	CString dir(ecore_file_dir_get(filepath));
 	if (!dir)
 		return nullptr;
+	// A name that is all extension (".jpg", ".photo") is kept whole.
 	CString stripped(ecore_file_strip_ext(filename.get()));
+	if (!stripped || !stripped.get()[0])
+		stripped.reset(strdup(filename.get()));
 	if (!stripped)
 		return nullptr;
 
-	size_t limit = strlen(stripped.get()) < LONG_NAME_LEN ? SHORT_NAME_LIMIT : LONG_NAME_LIMIT;
-	size_t size = strlen(dir.get()) + limit + 40;
+	size_t stem_len = strlen(stripped.get());
+	if (stem_len >= LONG_NAME_LEN)
+		stem_len = _save_utf8_cut(stripped.get(), LONG_NAME_CUT);
+	size_t size = strlen(dir.get()) + stem_len + 40;
 	CString name(static_cast<char *>(calloc(1, size)));
 	CString candidate(static_cast<char *>(calloc(1, size)));
 	if (!name || !candidate) {
 		IE_LOG_E("calloc failed");
 		return nullptr;
 	}
-	snprintf(name.get(), limit, "%s", stripped.get());
-	size_t stem_len = strlen(name.get());
+	memcpy(name.get(), stripped.get(), stem_len);
 
 	// The counter always has three digits, so one length check covers every
 	// candidate; a directory cut to fit save_dir would name another place.
@@ -157,8 +205,10 @@ bool _save_name_taken(const char *path)
 /* Moves save_name and save_path to the first free counter from `first`. */
 Eina_Bool _save_pick_free_name(int first)
 {
-	if (!save_stem_ready)
+	if (!save_stem_ready) {
+		IE_LOG_E("No name to save the picture under");
 		return EINA_FALSE;
+	}
 	for (int counter = first; counter <= LAST_COUNTER; counter++) {
 		if (!_save_compose_path(counter))
 			break;
@@ -176,89 +226,248 @@ bool _save_on_sdcard(const char *path)
 	return strncmp(path, IE_SAVE_SDCARD_ROOT, len) == 0 && (path[len] == '/' || path[len] == '\0');
 }
 
-/* Creates an empty temporary "*.jpg" (Evas picks its saver by the
- * extension) in save_dir, with the mode a plain new file would get. */
-bool _save_temp_create(char *tmp_path, size_t size)
+/* ---- The private directory ------------------------------------------- */
+
+struct WorkDir {
+	int fd = -1;
+	char name[sizeof(IE_SAVE_WORK_DIR_PREFIX) + WORK_DIR_RANDOM_LEN] = "";
+};
+
+bool _work_dir_name_valid(const char *name)
 {
-	for (int attempt = 0; attempt < TEMP_ATTEMPTS; attempt++) {
-		uint32_t random_part = 0;
-		if (getrandom(&random_part, sizeof(random_part), GRND_NONBLOCK) != sizeof(random_part))
-			random_part = static_cast<uint32_t>(getpid()) * 2654435761u + attempt;
-		snprintf(tmp_path, size, "%s/.ie-save-%08" PRIx32 "%s", save_dir, random_part, SAVE_EXT);
-		int fd = open(tmp_path, O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0666);
-		if (fd >= 0) {
-			close(fd);
-			return true;
+	size_t prefix = strlen(IE_SAVE_WORK_DIR_PREFIX);
+	if (strncmp(name, IE_SAVE_WORK_DIR_PREFIX, prefix) != 0 || strlen(name) != prefix + WORK_DIR_RANDOM_LEN)
+		return false;
+	for (const char *c = name + prefix; *c; c++)
+		if (!strchr(WORK_DIR_ALPHABET, *c))
+			return false;
+	return true;
+}
+
+void _work_dir_random_name(char *name, size_t size, int attempt)
+{
+	unsigned char bytes[WORK_DIR_RANDOM_LEN];
+	if (getrandom(bytes, sizeof(bytes), GRND_NONBLOCK) != static_cast<ssize_t>(sizeof(bytes))) {
+		uint64_t mix = (static_cast<uint64_t>(getpid()) << 32) ^ static_cast<uint64_t>(clock()) ^
+			       (static_cast<uint64_t>(attempt) * 0x9E3779B97F4A7C15ull);
+		for (unsigned char &byte : bytes) {
+			mix = mix * 6364136223846793005ull + 1442695040888963407ull;
+			byte = static_cast<unsigned char>(mix >> 56);
 		}
-		if (errno != EEXIST)
-			break;
 	}
-	IE_LOG_E("Cannot create a temporary file in %s: %s", save_dir, strerror(errno));
-	return false;
+	char random_part[WORK_DIR_RANDOM_LEN + 1];
+	for (size_t i = 0; i < WORK_DIR_RANDOM_LEN; i++)
+		random_part[i] = WORK_DIR_ALPHABET[bytes[i] % (sizeof(WORK_DIR_ALPHABET) - 1)];
+	random_part[WORK_DIR_RANDOM_LEN] = '\0';
+	snprintf(name, size, "%s%s", IE_SAVE_WORK_DIR_PREFIX, random_part);
 }
 
-/* The saver neither syncs nor checks its final flush: make sure the data
- * reached the disk and that something was written at all. */
-bool _save_flush_file(const char *path)
+/* Only a directory of this user that no one else may enter is ours. */
+bool _work_dir_private(int fd)
 {
-	int fd = open(path, O_RDONLY | O_CLOEXEC);
 	struct stat st;
-	bool flushed = fd >= 0 && fstat(fd, &st) == 0 && st.st_size > 0 && fsync(fd) == 0;
-	int saved_errno = errno;
-	if (fd >= 0)
-		close(fd);
-	if (!flushed)
-		IE_LOG_E("Cannot flush %s: %s", path, strerror(saved_errno));
-	return flushed;
+	return fstat(fd, &st) == 0 && S_ISDIR(st.st_mode) && st.st_nlink > 0 && st.st_uid == geteuid() &&
+	       (st.st_mode & 077) == 0;
 }
 
-/* Gives `tmp_path` the name `path` only if that name is free. */
-int _save_link_noreplace(const char *tmp_path, const char *path)
+/* Empties and removes a private directory whose lock `work` holds, then
+ * closes it. The name is removed only while it still is that directory. */
+void _work_dir_remove(int folder, WorkDir *work)
 {
-	if (renameat2(AT_FDCWD, tmp_path, AT_FDCWD, path, RENAME_NOREPLACE) == 0)
+	unlinkat(work->fd, WORK_PICTURE, 0);
+	struct stat mine, named;
+	if (fstat(work->fd, &mine) == 0 && fstatat(folder, work->name, &named, AT_SYMLINK_NOFOLLOW) == 0 &&
+	    named.st_dev == mine.st_dev && named.st_ino == mine.st_ino)
+		unlinkat(folder, work->name, AT_REMOVEDIR);
+	close(work->fd);
+	work->fd = -1;
+}
+
+/* Removes the private directories that saves killed on their way left in
+ * `folder`: ours by name, owner and mode, and locked by no live process. */
+void _work_dirs_remove_stale(int folder)
+{
+	int scan_fd = openat(folder, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+	DIR *listing = scan_fd >= 0 ? fdopendir(scan_fd) : nullptr;
+	if (!listing) {
+		if (scan_fd >= 0)
+			close(scan_fd);
+		return;
+	}
+	while (dirent *entry = readdir(listing)) {
+		if ((entry->d_type != DT_DIR && entry->d_type != DT_UNKNOWN) || !_work_dir_name_valid(entry->d_name))
+			continue;
+		WorkDir stale;
+		stale.fd = openat(folder, entry->d_name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+		if (stale.fd < 0)
+			continue;
+		if (_work_dir_private(stale.fd) && flock(stale.fd, LOCK_EX | LOCK_NB) == 0) {
+			snprintf(stale.name, sizeof(stale.name), "%s", entry->d_name);
+			_work_dir_remove(folder, &stale);
+		} else {
+			close(stale.fd);
+		}
+	}
+	closedir(listing);
+}
+
+/* Makes and locks a fresh private directory in `folder`. A cleaner may
+ * remove a new directory before it is locked, and another user may swap
+ * it: either way another name is tried. Returns 0 or an errno value. */
+int _work_dir_create(int folder, WorkDir *work)
+{
+	for (int attempt = 0; attempt < WORK_DIR_ATTEMPTS; attempt++) {
+		_work_dir_random_name(work->name, sizeof(work->name), attempt);
+		if (mkdirat(folder, work->name, 0700) != 0) {
+			if (errno == EEXIST)
+				continue;
+			int err = errno;
+			IE_LOG_E("Cannot create a private directory in %s: %s", save_dir, strerror(err));
+			return err;
+		}
+		int fd = openat(folder, work->name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+		if (fd >= 0 && flock(fd, LOCK_EX | LOCK_NB) == 0 && _work_dir_private(fd)) {
+			work->fd = fd;
+			return 0;
+		}
+		if (fd >= 0)
+			close(fd);
+	}
+	IE_LOG_E("Cannot create a private directory in %s: %s", save_dir, strerror(EEXIST));
+	return EEXIST;
+}
+
+/* ---- Writing --------------------------------------------------------- */
+
+/* The encoder reports no cause: its errno if it tells, else a full
+ * storage if the room left says so. */
+int _save_encoder_error(int encoder_errno, int work_fd)
+{
+	if (encoder_errno == ENOSPC || encoder_errno == EDQUOT)
+		return encoder_errno;
+	struct statvfs st;
+	if (fstatvfs(work_fd, &st) == 0 && !ie_save_free_space_enough(&st))
+		return ENOSPC;
+	return encoder_errno ? encoder_errno : EIO;
+}
+
+/* Has Evas's saver write `img` as WORK_PICTURE inside the private
+ * directory, reached through its descriptor so the path cannot lead
+ * anywhere else. Returns 0 or an errno value. */
+int _save_encode(Evas_Object *img, const WorkDir &work)
+{
+	char target[64];
+	snprintf(target, sizeof(target), "/proc/self/fd/%d/%s", work.fd, WORK_PICTURE);
+	Eina_Bool had_alpha = evas_object_image_alpha_get(img);
+	evas_object_image_alpha_set(img, EINA_TRUE);
+	errno = 0;
+	Eina_Bool written = evas_object_image_save(img, target, nullptr, nullptr);
+	int encoder_errno = errno;
+	// The flag tells whether the picture has alpha, for the next save too.
+	evas_object_image_alpha_set(img, had_alpha);
+	if (written)
+		return 0;
+	int err = _save_encoder_error(encoder_errno, work.fd);
+	IE_LOG_E("Cannot write the picture in %s: %s", save_dir, strerror(err));
+	return err;
+}
+
+/* Gives `from` in `from_dir` the name `to` in `to_dir` only if that name is
+ * free; never follows or replaces what is there. */
+int _save_rename_noreplace(int from_dir, const char *from, int to_dir, const char *to)
+{
+	if (renameat2(from_dir, from, to_dir, to, RENAME_NOREPLACE) == 0)
 		return 0;
 	if (errno != EINVAL && errno != ENOSYS && errno != EOPNOTSUPP)
 		return -1;
 	// File systems without the no-replace rename: a hard link also refuses
 	// an existing name.
-	if (link(tmp_path, path) != 0)
+	if (linkat(from_dir, from, to_dir, to, 0) != 0)
 		return -1;
-	unlink(tmp_path);
+	unlinkat(from_dir, from, 0);
 	return 0;
 }
 
-/* Publishes the written file under save_path, or under the next free name
- * when that one was taken since it was chosen. */
-bool _save_publish(const char *tmp_path)
+/* Publishes `work_name` (open as `file_fd`) under save_path, or under the
+ * next free name when that one was taken since it was chosen, and checks
+ * that the name now holds that very file. Returns 0 or an errno value. */
+int _save_publish(int folder, const WorkDir &work, const char *work_name, int file_fd)
 {
-	while (_save_link_noreplace(tmp_path, save_path) != 0) {
+	struct stat written;
+	if (fstat(file_fd, &written) != 0) {
+		int err = errno;
+		IE_LOG_E("Cannot publish %s: %s", save_path, strerror(err));
+		return err;
+	}
+	char final_name[SAVE_BUF_LEN + sizeof(SAVE_EXT)];
+	for (;;) {
+		snprintf(final_name, sizeof(final_name), "%s%s", save_name, SAVE_EXT);
+		if (_save_rename_noreplace(work.fd, work_name, folder, final_name) == 0)
+			break;
 		if (errno != EEXIST) {
-			IE_LOG_E("Cannot publish %s: %s", save_path, strerror(errno));
-			return false;
+			int err = errno;
+			IE_LOG_E("Cannot publish %s: %s", save_path, strerror(err));
+			return err;
 		}
 		IE_LOG_W("%s was taken, looking for another name", save_path);
 		if (!_save_pick_free_name(save_counter + 1))
-			return false;
+			return EEXIST;
 	}
-	int dir_fd = open(save_dir, O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-	if (dir_fd < 0 || fsync(dir_fd) != 0)
+	struct stat published;
+	if (fstatat(folder, final_name, &published, AT_SYMLINK_NOFOLLOW) != 0 || !S_ISREG(published.st_mode) ||
+	    published.st_dev != written.st_dev || published.st_ino != written.st_ino) {
+		IE_LOG_E("%s was replaced as it was published: %s", save_path, strerror(EEXIST));
+		return EEXIST;
+	}
+	if (fsync(folder) != 0)
 		IE_LOG_W("Cannot flush directory %s: %s", save_dir, strerror(errno));
-	if (dir_fd >= 0)
-		close(dir_fd);
-	return true;
+	return 0;
 }
 
-Eina_Bool _save_image_file(Evas_Object *img)
+/* Encodes, flushes and publishes, all inside `work`. Returns 0 or an
+ * errno value. */
+int _save_write_and_publish(Evas_Object *img, int folder, const WorkDir &work)
 {
-	char tmp_path[TEMP_PATH_LEN];
-	if (!_save_temp_create(tmp_path, sizeof(tmp_path)))
-		return EINA_FALSE;
-	evas_object_image_alpha_set(img, EINA_TRUE);
-	bool saved = evas_object_image_save(img, tmp_path, nullptr, nullptr) &&
-		     _save_flush_file(tmp_path) && _save_publish(tmp_path);
-	// After a publish the temporary name is already gone.
-	unlink(tmp_path);
-	return saved ? EINA_TRUE : EINA_FALSE;
+	int err = _save_encode(img, work);
+	if (err)
+		return err;
+	Fd picture(openat(work.fd, WORK_PICTURE, O_RDONLY | O_NOFOLLOW | O_CLOEXEC));
+	struct stat st;
+	if (!picture || fstat(picture.get(), &st) != 0) {
+		err = errno;
+		IE_LOG_E("Cannot read the written picture back: %s", strerror(err));
+		return err;
+	}
+	if (!S_ISREG(st.st_mode) || st.st_size <= 0) {
+		IE_LOG_E("Cannot read the written picture back: %s", strerror(EIO));
+		return EIO;
+	}
+	// The saver neither syncs nor checks its final flush.
+	if (fsync(picture.get()) != 0) {
+		err = errno;
+		IE_LOG_E("Cannot flush the picture in %s: %s", save_dir, strerror(err));
+		return err;
+	}
+	return _save_publish(folder, work, WORK_PICTURE, picture.get());
+}
+
+/* Returns 0 or an errno value. */
+int _save_image_file(Evas_Object *img)
+{
+	Fd folder(open(save_dir, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+	if (!folder) {
+		int err = errno;
+		IE_LOG_E("Cannot open the folder %s: %s", save_dir, strerror(err));
+		return err;
+	}
+	_work_dirs_remove_stale(folder.get());
+	WorkDir work;
+	int err = _work_dir_create(folder.get(), &work);
+	if (err)
+		return err;
+	err = _save_write_and_publish(img, folder.get(), work);
+	_work_dir_remove(folder.get(), &work);
+	return err;
 }
 
 } // namespace
@@ -318,16 +527,106 @@ char *_save_to_file(Evas_Object *img, Eina_Bool *memory_full)
 			*memory_full = EINA_TRUE;
 		return nullptr;
 	}
-	if (!_save_image_file(img))
+	int err = _save_image_file(img);
+	if (err) {
+		if ((err == ENOSPC || err == EDQUOT) && memory_full)
+			*memory_full = EINA_TRUE;
 		return nullptr;
-
-	int ret = media_content_scan_file(save_path);
-	if (ret != MEDIA_DB_ERROR_NONE)
-		IE_LOG_W("Fail to register new edited file to DB : %d", ret);
+	}
 
 	size_t len = strlen(save_path);
 	char *path = static_cast<char *>(calloc(len + 1, 1));
 	if (path)
 		memcpy(path, save_path, len);
+	else
+		IE_LOG_E("calloc failed");
 	return path;
+}
+
+/* ---- Registration ---------------------------------------------------- */
+
+struct _Ie_Save_Registration {
+	char *path;
+	int result;
+	Ie_Save_Registered_Cb done;
+	void *data;
+	/* The work ran on this thread inside ie_save_register: delivered by a
+	 * job instead, since the caller is not ready for it yet. */
+	Ecore_Job *delivery;
+	bool starting;
+	bool finished;
+	bool abandoned;
+};
+
+namespace {
+
+void _register_run(void *data, Ecore_Thread *)
+{
+	auto *registration = static_cast<Ie_Save_Registration *>(data);
+	registration->result = media_content_scan_file(registration->path);
+}
+
+void _register_deliver(Ie_Save_Registration *registration)
+{
+	if (registration->result != MEDIA_DB_ERROR_NONE)
+		IE_LOG_W("Fail to register new edited file to DB : %d", registration->result);
+	char *path = registration->path;
+	Ie_Save_Registered_Cb done = registration->abandoned ? nullptr : registration->done;
+	void *data = registration->data;
+	free(registration);
+	if (done)
+		done(data, path);
+	else
+		free(path);
+}
+
+void _register_delivery_job(void *data)
+{
+	auto *registration = static_cast<Ie_Save_Registration *>(data);
+	registration->delivery = nullptr;
+	_register_deliver(registration);
+}
+
+void _register_end(void *data, Ecore_Thread *)
+{
+	auto *registration = static_cast<Ie_Save_Registration *>(data);
+	registration->finished = true;
+	if (!registration->starting)
+		_register_deliver(registration);
+}
+
+} // namespace
+
+Ie_Save_Registration *ie_save_register(char *path, Ie_Save_Registered_Cb done, void *data)
+{
+	auto *registration = static_cast<Ie_Save_Registration *>(calloc(1, sizeof(Ie_Save_Registration)));
+	if (!registration) {
+		IE_LOG_E("calloc failed");
+		return nullptr;
+	}
+	registration->path = path;
+	registration->result = MEDIA_DB_ERROR_DB_FAILED;
+	registration->done = done;
+	registration->data = data;
+	registration->starting = true;
+	Ecore_Thread *thread = ecore_thread_run(_register_run, _register_end, _register_end, registration);
+	registration->starting = false;
+	if (!thread || registration->finished) {
+		registration->finished = true;
+		registration->delivery = ecore_job_add(_register_delivery_job, registration);
+	}
+	return registration;
+}
+
+void ie_save_register_abandon(Ie_Save_Registration *registration)
+{
+	if (!registration)
+		return;
+	if (registration->delivery) {
+		ecore_job_del(registration->delivery);
+		free(registration->path);
+		free(registration);
+		return;
+	}
+	registration->abandoned = true;
 }
