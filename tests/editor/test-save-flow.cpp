@@ -1,5 +1,6 @@
-/* Done's save as the user meets it: a failed save keeps the edit, and a
- * busy media database never stalls the editor. */
+/* Done's save as the user meets it: a failed save keeps the edit, a busy
+ * media database never stalls the editor, and the saved file shows what
+ * the screen showed. */
 #include <sqlite3.h>
 #include <sys/mount.h>
 #include <sys/statvfs.h>
@@ -232,6 +233,43 @@ TEST_F(SaveFlow, DestroyedWhileRegisteringTouchesNothingFreed)
 	holder = -1;
 	iet::run_for(0.3);
 	EXPECT_TRUE(close_requests.empty());
+}
+
+/* A half-transparent picture saves as it looks over white, not over
+ * black. */
+TEST_F(SaveFlow, TransparencyIsLaidOnWhite)
+{
+	std::string dir = iet::temp_dir(), source = dir + "/glass.png";
+	{
+		Evas_Object *img = evas_object_image_filled_add(evas());
+		evas_object_image_alpha_set(img, EINA_TRUE);
+		evas_object_image_size_set(img, 64, 48);
+		auto *pixels = static_cast<uint32_t *>(evas_object_image_data_get(img, EINA_TRUE));
+		// (200, 40, 40) at alpha 128, premultiplied.
+		for (int i = 0; i < 64 * 48; i++)
+			pixels[i] = 128u << 24 | 100u << 16 | 20u << 8 | 20u;
+		evas_object_image_data_set(img, pixels);
+		ASSERT_TRUE(evas_object_image_save(img, source.c_str(), nullptr, nullptr));
+		evas_object_del(img);
+	}
+	ASSERT_NE(open_editor_on_file(source), nullptr);
+	tap_rotate_right();
+	tap(vh->done_btn);
+	ASSERT_TRUE(wait_for_close());
+
+	Evas_Object *check = evas_object_image_add(evas());
+	evas_object_image_file_set(check, close_requests[0].c_str(), nullptr);
+	auto *saved = static_cast<const uint32_t *>(evas_object_image_data_get(check, EINA_FALSE));
+	ASSERT_NE(saved, nullptr);
+	double sum[3] = {};
+	for (int i = 0; i < 48 * 64; i++)
+		for (int c = 0; c < 3; c++)
+			sum[c] += (saved[i] >> (16 - 8 * c)) & 0xFF;
+	// Half of (200, 40, 40) and half of white.
+	const double expected[3] = {227, 147, 147};
+	for (int c = 0; c < 3; c++)
+		EXPECT_NEAR(sum[c] / (48 * 64), expected[c], 4.0) << "channel " << c;
+	evas_object_del(check);
 }
 
 } // namespace

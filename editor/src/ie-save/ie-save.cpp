@@ -339,6 +339,42 @@ int _work_dir_create(int folder, WorkDir *work)
 
 /* ---- Writing --------------------------------------------------------- */
 
+/* The encoder drops alpha from premultiplied pixels, which darkens them:
+ * lay them on white instead (white shows through by 255 - alpha). Works on
+ * a copy: the picture on screen stays as it is if the save fails. */
+Evas_Object *_save_flattened_copy(Evas_Object *img)
+{
+	int w = 0, h = 0;
+	evas_object_image_size_get(img, &w, &h);
+	int src_stride = evas_object_image_stride_get(img);
+	auto *src = static_cast<const uint8_t *>(evas_object_image_data_get(img, EINA_FALSE));
+	if (!src || w <= 0 || h <= 0)
+		return nullptr;
+	Evas_Object *flat = evas_object_image_add(evas_object_evas_get(img));
+	evas_object_image_alpha_set(flat, EINA_FALSE);
+	evas_object_image_size_set(flat, w, h);
+	int dst_stride = evas_object_image_stride_get(flat);
+	auto *dst = static_cast<uint8_t *>(evas_object_image_data_get(flat, EINA_TRUE));
+	if (!dst) {
+		evas_object_del(flat);
+		return nullptr;
+	}
+	for (int y = 0; y < h; y++) {
+		auto *in = reinterpret_cast<const uint32_t *>(src + static_cast<size_t>(y) * src_stride);
+		auto *out = reinterpret_cast<uint32_t *>(dst + static_cast<size_t>(y) * dst_stride);
+		for (int x = 0; x < w; x++) {
+			uint32_t p = in[x];
+			uint32_t white = 255 - (p >> 24);
+			uint32_t r = std::min<uint32_t>(255, ((p >> 16) & 0xFF) + white);
+			uint32_t g = std::min<uint32_t>(255, ((p >> 8) & 0xFF) + white);
+			uint32_t b = std::min<uint32_t>(255, (p & 0xFF) + white);
+			out[x] = 0xFF000000u | r << 16 | g << 8 | b;
+		}
+	}
+	evas_object_image_data_set(flat, dst);
+	return flat;
+}
+
 /* The encoder reports no cause: its errno if it tells, else a full
  * storage if the room left says so. */
 int _save_encoder_error(int encoder_errno, int work_fd)
@@ -359,12 +395,24 @@ int _save_encode(Evas_Object *img, const WorkDir &work)
 	char target[64];
 	snprintf(target, sizeof(target), "/proc/self/fd/%d/%s", work.fd, WORK_PICTURE);
 	Eina_Bool had_alpha = evas_object_image_alpha_get(img);
-	evas_object_image_alpha_set(img, EINA_TRUE);
+	Evas_Object *flat = nullptr;
+	if (had_alpha) {
+		flat = _save_flattened_copy(img);
+		if (!flat) {
+			IE_LOG_E("Cannot lay the picture on white: %s", strerror(ENOMEM));
+			return ENOMEM;
+		}
+	} else {
+		evas_object_image_alpha_set(img, EINA_TRUE);
+	}
 	errno = 0;
-	Eina_Bool written = evas_object_image_save(img, target, nullptr, nullptr);
+	Eina_Bool written = evas_object_image_save(flat ? flat : img, target, nullptr, nullptr);
 	int encoder_errno = errno;
 	// The flag tells whether the picture has alpha, for the next save too.
-	evas_object_image_alpha_set(img, had_alpha);
+	if (flat)
+		evas_object_del(flat);
+	else
+		evas_object_image_alpha_set(img, EINA_FALSE);
 	if (written)
 		return 0;
 	int err = _save_encoder_error(encoder_errno, work.fd);
