@@ -8,10 +8,12 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
+#include <ctime>
 #include <fstream>
 #include <media_db.h>
 
 #include "ie-test-harness.h"
+#include "ie-test-photo.h"
 
 namespace {
 
@@ -105,6 +107,39 @@ TEST_F(Demo, HeadlessRunWritesAScreenshot)
 	EXPECT_EQ(w, 720);
 	EXPECT_EQ(h, 1280);
 	evas_object_del(check);
+}
+
+/* A photograph turned by its EXIF block, rotated right and saved: upright,
+ * with its metadata, its date taken in the media database. */
+TEST_F(Demo, APhotographKeepsItsMetadata)
+{
+	std::string dir = iet::temp_dir();
+	std::string photo = dir + "/camera.jpg";
+	ASSERT_TRUE(iet::write_photo(photo, 800, 600, 6));
+	long before = static_cast<long>(time(nullptr));
+	int status = 0;
+	std::string output = run_host(photo, "--do rotate-right --do done", &status);
+	ASSERT_EQ(status, 0) << output;
+	std::string path = saved_path(output);
+	ASSERT_EQ(path, dir + "/camera_e001.jpg") << output;
+	iet::expect_photo_metadata(path, 800, 600, before);
+
+	Evas_Object *check = evas_object_image_add(evas());
+	evas_object_image_load_orientation_set(check, EINA_TRUE);
+	evas_object_image_file_set(check, path.c_str(), nullptr);
+	int w = 0, h = 0;
+	evas_object_image_size_get(check, &w, &h);
+	ASSERT_EQ(w * 1000 + h, 800 * 1000 + 600);
+	/* Stored top left, the marked corner is turned twice to bottom right. */
+	auto *pixels = static_cast<const uint32_t *>(evas_object_image_data_get(check, EINA_FALSE));
+	ASSERT_NE(pixels, nullptr);
+	EXPECT_GT(pixels[(h - 6) * w + (w - 6)] & 0xff, 200u) << "marked corner";
+	EXPECT_LT(pixels[5 * w + 5] & 0xff, 160u);
+	evas_object_del(check);
+
+	Media_Db_Row row;
+	ASSERT_EQ(media_db_lookup(path.c_str(), &row), MEDIA_DB_ERROR_NONE);
+	EXPECT_STREQ(row.date_taken, "2021-07-14 09:30:05");
 }
 
 /* A save that fails keeps the editor open with its popup; its OK closes

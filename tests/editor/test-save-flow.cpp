@@ -1,6 +1,6 @@
 /* Done's save as the user meets it: a failed save keeps the edit, a busy
  * media database never stalls the editor, and the saved file shows what
- * the screen showed. */
+ * the screen showed, with the photograph's metadata. */
 #include <sqlite3.h>
 #include <sys/mount.h>
 #include <sys/statvfs.h>
@@ -16,6 +16,7 @@
 
 #include "editor-fixture.h"
 #include "ie-image.h"
+#include "ie-test-photo.h"
 
 namespace fs = std::filesystem;
 
@@ -270,6 +271,41 @@ TEST_F(SaveFlow, TransparencyIsLaidOnWhite)
 	for (int c = 0; c < 3; c++)
 		EXPECT_NEAR(sum[c] / (48 * 64), expected[c], 4.0) << "channel " << c;
 	evas_object_del(check);
+}
+
+/* A photograph turned by its EXIF block, rotated and saved: upright pixels
+ * with Orientation 1, and the rest of its metadata kept. */
+TEST_F(SaveFlow, ThePhotographsMetadataGoesWithTheEdit)
+{
+	std::string dir = iet::temp_dir(), source = dir + "/camera.jpg";
+	ASSERT_TRUE(iet::write_photo(source, 64, 48, 6));
+	ASSERT_NE(open_editor_on_file(source), nullptr);
+	int w = 0, h = 0;
+	picture_size(&w, &h);
+	ASSERT_EQ(w * 1000 + h, 48 * 1000 + 64) << "shown turned as its EXIF block says";
+	tap_rotate_right();
+	long before = static_cast<long>(time(nullptr));
+	tap(vh->done_btn);
+	ASSERT_TRUE(wait_for_close());
+	std::string saved = close_requests[0];
+	iet::expect_photo_metadata(saved, 64, 48, before);
+
+	// Stored turned a quarter by its EXIF block and a quarter by the user:
+	// the marked corner, top left as stored, is at the bottom right.
+	Evas_Object *check = evas_object_image_add(evas());
+	evas_object_image_load_orientation_set(check, EINA_TRUE);
+	evas_object_image_file_set(check, saved.c_str(), nullptr);
+	evas_object_image_size_get(check, &w, &h);
+	ASSERT_EQ(w * 1000 + h, 64 * 1000 + 48);
+	auto *pixels = static_cast<const uint32_t *>(evas_object_image_data_get(check, EINA_FALSE));
+	ASSERT_NE(pixels, nullptr);
+	EXPECT_GT(pixels[(h - 3) * w + (w - 3)] & 0xFF, 200u) << "marked corner";
+	EXPECT_LT(pixels[2 * w + 2] & 0xFF, 160u);
+	evas_object_del(check);
+
+	Media_Db_Row row;
+	ASSERT_EQ(media_db_lookup(saved.c_str(), &row), MEDIA_DB_ERROR_NONE);
+	EXPECT_STREQ(row.date_taken, "2021-07-14 09:30:05");
 }
 
 } // namespace

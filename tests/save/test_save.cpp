@@ -27,9 +27,9 @@
 #include <jpeglib.h>
 #include <random>
 
-
 #include "ie-save-private.h"
 #include "ie-save.h"
+#include "ie-test-photo.h"
 
 namespace fs = std::filesystem;
 
@@ -583,6 +583,38 @@ TEST_F(SaveTest, SavesKilledOnTheirWayLeaveNothingBehind)
 		std::string bytes = read_bytes(dir + "/" + name);
 		EXPECT_EQ(bytes.substr(bytes.size() - 2), "\xFF\xD9") << name;
 	}
+}
+
+/* Metadata comes only from a JPEG source; a damaged EXIF block is left
+ * out with a warning, and the colour profile still goes. */
+TEST_F(SaveTest, MetadataOnlyFromWhatTheSourceCarriesReadably)
+{
+	auto markers = [](const std::string &path) {
+		std::vector<int> found;
+		for (const iet::Segment &segment : iet::jpeg_segments(path))
+			if (segment.marker >= 0xE0 && segment.marker <= 0xEF)
+				found.push_back(segment.marker);
+		return found;
+	};
+	std::string png = dir + "/plain.png";
+	ASSERT_TRUE(iet::write_picture(png, 32, 24));
+	_save_init(png.c_str());
+	std::string from_png = save(32, 24);
+	EXPECT_EQ(markers(from_png), std::vector<int>{0xE0}) << "the encoder's JFIF header alone";
+
+	std::string damaged = dir + "/damaged.jpg";
+	ASSERT_TRUE(iet::write_photo(damaged, 32, 24, 6));
+	std::string bytes = read_bytes(damaged);
+	size_t tiff = bytes.find(std::string("Exif\0\0", 6)) + 6;
+	bytes.replace(tiff, 4, std::string("XX\x2A\x00", 4));
+	write_bytes(damaged, bytes);
+	_save_init(damaged.c_str());
+	iet::log_clear();
+	std::string from_damaged = save(32, 24);
+	ASSERT_FALSE(from_damaged.empty());
+	EXPECT_EQ(markers(from_damaged), (std::vector<int>{0xE0, 0xE2, 0xE2}));
+	EXPECT_TRUE(iet::jpeg_icc_profile(from_damaged) == iet::test_icc_profile());
+	EXPECT_EQ(iet::log_count("The EXIF block of " + damaged + " is damaged; saving without it", PLATFORM_LOG_WARN), 1);
 }
 
 } // namespace

@@ -3,6 +3,7 @@
 #define IE_SAVE_PRIVATE_H
 
 #include <sys/statvfs.h>
+#include <time.h>
 #include <Eina.h>
 
 /* Storage measured directly when the save path lies below it. */
@@ -22,6 +23,14 @@ Eina_Bool ie_save_free_space_enough(const struct statvfs *st);
 
 #ifdef __cplusplus
 }
+
+#include <string>
+
+/* The marker segments to follow the start (and JFIF header) of a JPEG
+ * saved from `source`: the source's EXIF block brought up to date for a
+ * picture of `width` x `height` written at `now`, and its colour profile,
+ * byte for byte. Empty for a source without them, or not a JPEG. */
+std::string ie_save_metadata_segments(const char *source, int width, int height, time_t now);
 #endif
 
 #endif

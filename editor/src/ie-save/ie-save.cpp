@@ -48,8 +48,10 @@ constexpr char SAVE_EXT[] = ".jpg";
 constexpr int WORK_DIR_ATTEMPTS = 64;
 constexpr size_t WORK_DIR_RANDOM_LEN = 12;
 constexpr char WORK_DIR_ALPHABET[] = "abcdefghijklmnopqrstuvwxyz0123456789";
-/* Inside the private directory: what the encoder wrote. */
+/* Inside the private directory: what the encoder wrote, and its copy with
+ * the source's metadata. */
 constexpr char WORK_PICTURE[] = "picture.jpg";
+constexpr char WORK_OUTPUT[] = "output.jpg";
 
 char save_dir[SAVE_BUF_LEN];
 char save_name[SAVE_BUF_LEN];
@@ -59,6 +61,8 @@ char save_path[SAVE_BUF_LEN];
 char save_stem[SAVE_BUF_LEN];
 bool save_stem_ready;
 int save_counter;
+/* The source, whose metadata the saved picture carries. */
+char save_source[PATH_MAX];
 
 struct FreeDeleter {
 	void operator()(void *ptr) const { free(ptr); }
@@ -275,6 +279,7 @@ bool _work_dir_private(int fd)
 void _work_dir_remove(int folder, WorkDir *work)
 {
 	unlinkat(work->fd, WORK_PICTURE, 0);
+	unlinkat(work->fd, WORK_OUTPUT, 0);
 	struct stat mine, named;
 	if (fstat(work->fd, &mine) == 0 && fstatat(folder, work->name, &named, AT_SYMLINK_NOFOLLOW) == 0 &&
 	    named.st_dev == mine.st_dev && named.st_ino == mine.st_ino)
@@ -420,6 +425,63 @@ int _save_encode(Evas_Object *img, const WorkDir &work)
 	return err;
 }
 
+bool _save_write_all(int fd, const char *data, size_t len)
+{
+	while (len > 0) {
+		ssize_t done = write(fd, data, len);
+		if (done < 0 && errno == EINTR)
+			continue;
+		if (done <= 0) {
+			if (done == 0)
+				errno = EIO;
+			return false;
+		}
+		data += done;
+		len -= static_cast<size_t>(done);
+	}
+	return true;
+}
+
+/* Copies the encoder's file into WORK_OUTPUT with `metadata` after its
+ * start (and JFIF header). Returns 0 or an errno value; `output` stays
+ * closed when the encoder's file cannot take the metadata, which is then
+ * left out. */
+int _save_add_metadata(int picture_fd, off_t size, const WorkDir &work, const std::string &metadata, Fd *output)
+{
+	std::string jpeg(static_cast<size_t>(size), '\0');
+	for (size_t done = 0; done < jpeg.size();) {
+		ssize_t got = pread(picture_fd, &jpeg[done], jpeg.size() - done, static_cast<off_t>(done));
+		if (got < 0 && errno == EINTR)
+			continue;
+		if (got <= 0) {
+			int err = got < 0 ? errno : EIO;
+			IE_LOG_E("Cannot read the written picture back: %s", strerror(err));
+			return err;
+		}
+		done += static_cast<size_t>(got);
+	}
+	auto byte = [&jpeg](size_t at) { return static_cast<unsigned char>(jpeg[at]); };
+	if (jpeg.size() < 4 || byte(0) != 0xFF || byte(1) != 0xD8) {
+		IE_LOG_W("The written picture is no JPEG; saving it without metadata");
+		return 0;
+	}
+	size_t insert_at = 2;
+	if (byte(2) == 0xFF && byte(3) == 0xE0 && jpeg.size() >= 6) {
+		size_t app0_end = 4 + (static_cast<size_t>(byte(4)) << 8 | byte(5));
+		if (app0_end <= jpeg.size())
+			insert_at = app0_end;
+	}
+	output->reset(openat(work.fd, WORK_OUTPUT, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0666));
+	if (!*output || !_save_write_all(output->get(), jpeg.data(), insert_at) ||
+	    !_save_write_all(output->get(), metadata.data(), metadata.size()) ||
+	    !_save_write_all(output->get(), jpeg.data() + insert_at, jpeg.size() - insert_at)) {
+		int err = errno;
+		IE_LOG_E("Cannot write the picture in %s: %s", save_dir, strerror(err));
+		return err;
+	}
+	return 0;
+}
+
 /* Gives `from` in `from_dir` the name `to` in `to_dir` only if that name is
  * free; never follows or replaces what is there. */
 int _save_rename_noreplace(int from_dir, const char *from, int to_dir, const char *to)
@@ -472,8 +534,8 @@ int _save_publish(int folder, const WorkDir &work, const char *work_name, int fi
 	return 0;
 }
 
-/* Encodes, flushes and publishes, all inside `work`. Returns 0 or an
- * errno value. */
+/* Encodes, adds the source's metadata, flushes and publishes, all inside
+ * `work`. Returns 0 or an errno value. */
 int _save_write_and_publish(Evas_Object *img, int folder, const WorkDir &work)
 {
 	int err = _save_encode(img, work);
@@ -490,13 +552,25 @@ int _save_write_and_publish(Evas_Object *img, int folder, const WorkDir &work)
 		IE_LOG_E("Cannot read the written picture back: %s", strerror(EIO));
 		return EIO;
 	}
+
+	int w = 0, h = 0;
+	evas_object_image_size_get(img, &w, &h);
+	std::string metadata = ie_save_metadata_segments(save_source, w, h, time(nullptr));
+	Fd output;
+	if (!metadata.empty()) {
+		err = _save_add_metadata(picture.get(), st.st_size, work, metadata, &output);
+		if (err)
+			return err;
+	}
+	const char *name = output ? WORK_OUTPUT : WORK_PICTURE;
+	int fd = output ? output.get() : picture.get();
 	// The saver neither syncs nor checks its final flush.
-	if (fsync(picture.get()) != 0) {
+	if (fsync(fd) != 0) {
 		err = errno;
 		IE_LOG_E("Cannot flush the picture in %s: %s", save_dir, strerror(err));
 		return err;
 	}
-	return _save_publish(folder, work, WORK_PICTURE, picture.get());
+	return _save_publish(folder, work, name, fd);
 }
 
 /* Returns 0 or an errno value. */
@@ -534,6 +608,7 @@ void _save_init(const char *filepath)
 	save_stem[0] = '\0';
 	save_stem_ready = false;
 	_save_clear_choice();
+	snprintf(save_source, sizeof(save_source), "%s", filepath);
 
 	_save_create_auto_filename(filepath);
 	if (!save_name[0] || !_save_compose_path(save_counter))

@@ -15,7 +15,8 @@ void _save_init(const char *filepath);
 const char *ie_save_path_get(void);
 /* EINA_TRUE when the storage of the save path has room for a picture. */
 Eina_Bool get_internal_memory_status(struct statvfs *st);
-/* Writes the pixels of `img` as a new file under the save path, or
+/* Writes the pixels of `img` (laid on white when it has alpha), with the
+ * source photograph's metadata, as a new file under the save path, or
  * under the next free name when that one was taken meanwhile. Returns a
  * calloc'ed copy of the path written, or NULL; sets *memory_full when the
  * storage was too full, before or while writing. A failure is logged once,
