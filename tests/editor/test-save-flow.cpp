@@ -187,6 +187,10 @@ TEST_F(SaveFlow, ABusyDatabaseNeverStallsTheEditor)
 	EXPECT_LT(ecore_time_get() - start, 1.0) << "Done came back to the main loop";
 	EXPECT_TRUE(elm_object_disabled_get(vh->done_btn));
 	EXPECT_TRUE(elm_object_disabled_get(vh->cancel_btn));
+	// An edit now would be lost with the close: the tools wait too.
+	auto saved_pixels = picture_pixels();
+	tap_rotate_right();
+	EXPECT_TRUE(picture_pixels() == saved_pixels);
 
 	int ticks = 0;
 	Ecore_Timer *ticker = ecore_timer_add(0.01, [](void *data) -> Eina_Bool {

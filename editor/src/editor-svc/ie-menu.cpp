@@ -281,13 +281,16 @@ static void save_and_close(Viewhandle *vh)
 		return;
 	}
 	// The database may be held by another process: the main loop goes on
-	// meanwhile, with the editor waiting for it.
+	// meanwhile, with the editor waiting for it and taking no more edits,
+	// which the saved file would not have.
 	vh->save_registration = ie_save_register(path, _on_save_registered, vh);
 	if (!vh->save_registration) {
 		evas_object_smart_callback_call(vh->layout, "delete,me", path);
 		return;
 	}
 	buttons_disabled_set(vh, EINA_TRUE);
+	if (vh->toolbar)
+		evas_object_pass_events_set(vh->toolbar, EINA_TRUE);
 	vh->save_popup_timer = ecore_timer_add(IE_SAVE_POPUP_DELAY, _save_popup_timer_cb, vh);
 }
 

@@ -577,6 +577,10 @@ int _save_write_and_publish(Evas_Object *img, int folder, const WorkDir &work)
 int _save_image_file(Evas_Object *img)
 {
 	Fd folder(open(save_dir, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+	// A folder one may write to but not list still takes a save; only the
+	// removal of leftovers and the flush of the folder need to read it.
+	if (!folder && errno == EACCES)
+		folder.reset(open(save_dir, O_PATH | O_DIRECTORY | O_CLOEXEC));
 	if (!folder) {
 		int err = errno;
 		IE_LOG_E("Cannot open the folder %s: %s", save_dir, strerror(err));
