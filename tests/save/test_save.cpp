@@ -387,7 +387,7 @@ TEST_F(SaveTest, RegistrationReportsBackOnTheMainLoop)
 
 	// Abandoned: the callback never runs, nothing leaks.
 	ie_save_register_abandon(ie_save_register(strdup(path.c_str()), collect, &delivered));
-	iet::run_for(0.2);
+	iet::run_for(1.0);
 	EXPECT_EQ(delivered.size(), 1u);
 }
 
