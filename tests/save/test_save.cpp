@@ -100,6 +100,7 @@ protected:
 		if (!created_dir.empty())
 			fs::remove_all(created_dir, ignored);
 		setenv("STORAGE_INTERNAL_ROOT", internal_root.c_str(), 1);
+		ie_save_unnamed_files_set(EINA_TRUE);
 		iet::EflTest::TearDown();
 	}
 
@@ -394,9 +395,9 @@ TEST_F(SaveTest, RegistrationReportsBackOnTheMainLoop)
 /* Another user who can write to the folder, as fast as it can: every name
  * it sees appear there is swapped for a symlink to the source or to a
  * victim file, and after each published copy it plants a symlink to the
- * victim at the next counter. Counts its swaps in `swaps` (shared). */
+ * victim at the next counter. Counts what it did in `attacks` (shared). */
 pid_t start_racer(const std::string &folder, const std::string &stem, const std::string &source,
-		  const std::string &victim, unsigned *swaps)
+		  const std::string &victim, unsigned *attacks)
 {
 	pid_t pid = fork();
 	if (pid != 0)
@@ -427,21 +428,23 @@ pid_t start_racer(const std::string &folder, const std::string &stem, const std:
 				char next[64];
 				snprintf(next, sizeof(next), "_e%03d.jpg", counter + 1);
 				struct stat st;
-				if (lstat(name.c_str(), &st) == 0 && S_ISREG(st.st_mode))
-					symlink(victim.c_str(), (stem + next).c_str());
+				if (lstat(name.c_str(), &st) == 0 && S_ISREG(st.st_mode) &&
+				    symlink(victim.c_str(), (stem + next).c_str()) == 0)
+					__atomic_add_fetch(attacks, 1, __ATOMIC_RELAXED);
 				continue;
 			}
 			std::string moved = name + "." + std::to_string(round) + "~moved";
 			if (rename(name.c_str(), moved.c_str()) == 0 &&
 			    symlink((round & 1 ? source : victim).c_str(), name.c_str()) == 0)
-				__atomic_add_fetch(swaps, 1, __ATOMIC_RELAXED);
+				__atomic_add_fetch(attacks, 1, __ATOMIC_RELAXED);
 		}
 		closedir(listing);
 	}
 }
 
 /* Nothing the save creates may be reached by a name another process can
- * swap: the racer never gets the saver to write through its links. */
+ * swap: the racer never gets the saver to write through its links, with
+ * unnamed files or in a private directory. */
 TEST_F(SaveTest, ARacingProcessCannotRedirectTheWrite)
 {
 	std::string folder = dir + "/shared";
@@ -454,53 +457,58 @@ TEST_F(SaveTest, ARacingProcessCannotRedirectTheWrite)
 	ASSERT_TRUE(iet::write_picture(source, 24, 16));
 	write_bytes(victim, "precious");
 	std::string source_bytes = read_bytes(source);
-
-	auto *swaps = static_cast<unsigned *>(
+	auto *attacks = static_cast<unsigned *>(
 		mmap(nullptr, sizeof(unsigned), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0));
-	ASSERT_NE(swaps, MAP_FAILED);
-	*swaps = 0;
-	pid_t racer = start_racer(folder, "a", source, victim, swaps);
-	ASSERT_GT(racer, 0);
+	ASSERT_NE(attacks, MAP_FAILED);
 	allow_efl_error("Image save failed.");
-
-	std::vector<std::string> saved;
-	int failed = 0;
 	Evas_Object *img = picture(32, 24);
-	for (int i = 0; i < 200; i++) {
-		_save_init(source.c_str());
-		Eina_Bool memory_full = EINA_FALSE;
-		char *path = _save_to_file(img, &memory_full);
-		if (path)
-			saved.push_back(path);
-		else
-			failed++;
-		free(path);
-	}
-	kill(racer, SIGKILL);
-	int status = 0;
-	waitpid(racer, &status, 0);
-	EXPECT_TRUE(WIFSIGNALED(status)) << "the racer stopped early: " << WEXITSTATUS(status);
 
-	EXPECT_GT(*swaps, 50u) << "the racer hardly raced";
-	EXPECT_EQ(read_bytes(source), source_bytes);
-	EXPECT_EQ(read_bytes(victim), "precious");
-	EXPECT_GE(saved.size(), 150u) << failed << " saves failed";
-	for (const std::string &path : saved) {
-		struct stat st;
-		ASSERT_EQ(lstat(path.c_str(), &st), 0) << path;
-		EXPECT_TRUE(S_ISREG(st.st_mode)) << path << " is not the written file";
-		Evas_Object *check = evas_object_image_add(evas());
-		evas_object_image_file_set(check, path.c_str(), nullptr);
-		int w = 0, h = 0;
-		evas_object_image_size_get(check, &w, &h);
-		EXPECT_EQ(w * 1000 + h, 32 * 1000 + 24) << path;
-		evas_object_del(check);
+	for (Eina_Bool unnamed : {EINA_TRUE, EINA_FALSE}) {
+		SCOPED_TRACE(unnamed ? "unnamed files" : "private directory");
+		ie_save_unnamed_files_set(unnamed);
+		*attacks = 0;
+		pid_t racer = start_racer(folder, "a", source, victim, attacks);
+		ASSERT_GT(racer, 0);
+		std::vector<std::string> saved;
+		int failed = 0;
+		for (int i = 0; i < 200; i++) {
+			_save_init(source.c_str());
+			Eina_Bool memory_full = EINA_FALSE;
+			CString path(_save_to_file(img, &memory_full));
+			if (path)
+				saved.push_back(path.get());
+			else
+				failed++;
+		}
+		kill(racer, SIGKILL);
+		int status = 0;
+		waitpid(racer, &status, 0);
+		EXPECT_TRUE(WIFSIGNALED(status)) << "the racer stopped early: " << WEXITSTATUS(status);
+
+		// Unnamed files leave it only the published names to plant links by.
+		EXPECT_GT(*attacks, unnamed ? 0u : 50u) << "the racer hardly raced";
+		EXPECT_EQ(read_bytes(source), source_bytes);
+		EXPECT_EQ(read_bytes(victim), "precious");
+		EXPECT_GE(saved.size(), 150u) << failed << " saves failed";
+		for (const std::string &path : saved) {
+			struct stat st;
+			ASSERT_EQ(lstat(path.c_str(), &st), 0) << path;
+			EXPECT_TRUE(S_ISREG(st.st_mode)) << path << " is not the written file";
+			Evas_Object *check = evas_object_image_add(evas());
+			evas_object_image_file_set(check, path.c_str(), nullptr);
+			int w = 0, h = 0;
+			evas_object_image_size_get(check, &w, &h);
+			EXPECT_EQ(w * 1000 + h, 32 * 1000 + 24) << path;
+			evas_object_del(check);
+			unlink(path.c_str());
+		}
 	}
-	munmap(swaps, sizeof(unsigned));
+	munmap(attacks, sizeof(unsigned));
 }
 
-/* A save killed on its way leaves its private directory behind; the next
- * save in that folder removes it, but never one that a live save holds. */
+/* A save killed on its way leaves nothing in the folder with unnamed
+ * files. In a private directory it leaves that directory, which the next
+ * save in the folder removes, but never one that a live save holds. */
 TEST_F(SaveTest, SavesKilledOnTheirWayLeaveNothingBehind)
 {
 	std::string source = dir + "/a.png";
@@ -531,20 +539,30 @@ TEST_F(SaveTest, SavesKilledOnTheirWayLeaveNothingBehind)
 		return pid;
 	};
 
+	// Kills saves at random points until `wanted` of them left something
+	// besides whole pictures, or `count` were killed; returns how many did.
 	// Each save clears what the one killed before it left.
 	std::mt19937 rng(7);
-	int left_behind = 0;
-	for (int kill_count = 0; kill_count < 20; kill_count++) {
-		pid_t child = save_in_child();
-		ASSERT_GT(child, 0);
-		usleep(5000 + rng() % 50000);
-		kill(child, SIGKILL);
-		waitpid(child, nullptr, 0);
-		size_t found = work_dirs().size();
-		EXPECT_LE(found, 1u);
-		left_behind += found != 0;
-	}
-	ASSERT_GT(left_behind, 0) << "no kill landed inside a save";
+	auto kill_saves = [&](int count, int wanted) {
+		int left_behind = 0;
+		for (int kill_count = 0; kill_count < count && left_behind < wanted; kill_count++) {
+			pid_t child = save_in_child();
+			EXPECT_GT(child, 0);
+			usleep(5000 + rng() % 50000);
+			kill(child, SIGKILL);
+			waitpid(child, nullptr, 0);
+			size_t found = 0;
+			for (const std::string &name : entries(dir))
+				found += name[0] == '.';
+			EXPECT_LE(found, 1u);
+			left_behind += found != 0;
+		}
+		return left_behind;
+	};
+	EXPECT_EQ(kill_saves(10, 1), 0) << "an unnamed file went with its process";
+
+	ie_save_unnamed_files_set(EINA_FALSE);
+	ASSERT_EQ(kill_saves(100, 3), 3) << "too few kills landed inside a save";
 
 	// Stop a live save while it holds its directory.
 	std::string held;

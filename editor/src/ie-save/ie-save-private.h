@@ -10,8 +10,9 @@
 #define IE_SAVE_SDCARD_ROOT "/opt/storage/sdcard"
 /* A full-size JPEG needs about this much room. */
 #define IE_SAVE_MIN_FREE_BYTES 1242880ULL
-/* A save works in a private directory of this name plus 12 letters or
- * digits, made in the destination folder and removed afterwards. */
+/* A private directory of this name plus 12 letters or digits: made by a
+ * save in the destination folder where unnamed files cannot be, and once
+ * per process in the runtime directory to reach those files by name. */
 #define IE_SAVE_WORK_DIR_PREFIX ".ie-save-"
 
 #ifdef __cplusplus
@@ -20,6 +21,10 @@ extern "C" {
 
 /* EINA_TRUE when `st` reports at least IE_SAVE_MIN_FREE_BYTES available. */
 Eina_Bool ie_save_free_space_enough(const struct statvfs *st);
+/* Whether saves write unnamed files where the file system has them (the
+ * default); without, they write in a private directory, as on file systems
+ * that have none. */
+void ie_save_unnamed_files_set(Eina_Bool enabled);
 
 #ifdef __cplusplus
 }

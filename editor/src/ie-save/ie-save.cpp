@@ -2,12 +2,15 @@
  *
  * Other users may write to the destination folder, so once a save starts
  * nothing is reached through a name they could swap: the picture is written
- * in a private directory (mode 0700) made inside that folder and reached
- * through its descriptor, flushed, published under its name with a rename
- * that never replaces an existing entry, and checked to be the file that was
- * written. The private directory is locked while in use; one left behind by
- * a process that died is removed by the next save in the folder. A failed
- * save leaves the folder as it was, and the source is never touched. */
+ * to an unnamed file in that folder (O_TMPFILE), which Evas's saver reaches
+ * through a link in a private directory of this process; it is flushed,
+ * linked under its name without replacing any entry, and checked to be the
+ * file that was written. A process killed on the way leaves nothing in the
+ * folder. File systems without unnamed files get a private directory (mode
+ * 0700) made in the folder instead, locked while in use and published from
+ * with a rename that never replaces; one left behind by a process that died
+ * is removed by the next save in that folder. A failed save leaves the
+ * folder as it was; the source is never touched. */
 #include "ie-save.h"
 #include "ie-save-private.h"
 
@@ -48,7 +51,7 @@ constexpr char SAVE_EXT[] = ".jpg";
 constexpr int WORK_DIR_ATTEMPTS = 64;
 constexpr size_t WORK_DIR_RANDOM_LEN = 12;
 constexpr char WORK_DIR_ALPHABET[] = "abcdefghijklmnopqrstuvwxyz0123456789";
-/* Inside the private directory: what the encoder wrote, and its copy with
+/* Inside a private directory: what the encoder wrote, and its copy with
  * the source's metadata. */
 constexpr char WORK_PICTURE[] = "picture.jpg";
 constexpr char WORK_OUTPUT[] = "output.jpg";
@@ -63,6 +66,9 @@ bool save_stem_ready;
 int save_counter;
 /* The source, whose metadata the saved picture carries. */
 char save_source[PATH_MAX];
+/* Unnamed scratch files where the file system has them; tests turn them
+ * off to reach the private directory other file systems get. */
+bool save_unnamed_files = true;
 
 struct FreeDeleter {
 	void operator()(void *ptr) const { free(ptr); }
@@ -326,9 +332,7 @@ int _work_dir_create(int folder, WorkDir *work)
 		if (mkdirat(folder, work->name, 0700) != 0) {
 			if (errno == EEXIST)
 				continue;
-			int err = errno;
-			IE_LOG_E("Cannot create a private directory in %s: %s", save_dir, strerror(err));
-			return err;
+			return errno;
 		}
 		int fd = openat(folder, work->name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
 		if (fd >= 0 && flock(fd, LOCK_EX | LOCK_NB) == 0 && _work_dir_private(fd)) {
@@ -338,8 +342,83 @@ int _work_dir_create(int folder, WorkDir *work)
 		if (fd >= 0)
 			close(fd);
 	}
-	IE_LOG_E("Cannot create a private directory in %s: %s", save_dir, strerror(EEXIST));
 	return EEXIST;
+}
+
+/* ---- Scratch files ---------------------------------------------------- */
+
+/* Evas's saver opens a path and picks its format by the extension, which
+ * an unnamed file does not have: it reaches one through a link named
+ * WORK_PICTURE in a private directory of this process, made once in the
+ * user's runtime (or temporary) directory and locked while the process
+ * lives, so that a later process may sweep it away. */
+WorkDir link_dir;
+
+bool _link_dir_ready(void)
+{
+	if (link_dir.fd >= 0)
+		return true;
+	const char *base = getenv("XDG_RUNTIME_DIR");
+	if (!base || !*base)
+		base = getenv("TMPDIR");
+	Fd base_fd(open(base && *base ? base : "/tmp", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+	if (!base_fd)
+		return false;
+	_work_dirs_remove_stale(base_fd.get());
+	return _work_dir_create(base_fd.get(), &link_dir) == 0;
+}
+
+/* Where one save writes before it publishes, in the destination folder:
+ * unnamed files, or named ones inside a private directory made there. */
+struct Scratch {
+	int folder = -1;
+	WorkDir work; /* fd -1 while unnamed files are used */
+	bool unnamed() const { return work.fd < 0; }
+};
+
+/* A new scratch file, open for reading and writing; `name` names it in a
+ * private directory. Returns 0 or an errno value. */
+int _scratch_file_create(const Scratch &scratch, const char *name, Fd *file)
+{
+	file->reset(scratch.unnamed()
+			    ? openat(scratch.folder, ".", O_TMPFILE | O_RDWR | O_CLOEXEC, 0666)
+			    : openat(scratch.work.fd, name, O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0666));
+	if (*file)
+		return 0;
+	int err = errno;
+	IE_LOG_E("Cannot create a file in %s: %s", save_dir, strerror(err));
+	return err;
+}
+
+/* Prepares the scratch space in `folder` and creates the encoder's file
+ * in it. Returns 0 or an errno value. */
+int _scratch_open(int folder, Scratch *scratch, Fd *picture)
+{
+	scratch->folder = folder;
+	_work_dirs_remove_stale(folder);
+	if (save_unnamed_files && _link_dir_ready()) {
+		picture->reset(openat(folder, ".", O_TMPFILE | O_RDWR | O_CLOEXEC, 0666));
+		if (*picture)
+			return 0;
+		// What file systems without unnamed files answer.
+		if (errno != EOPNOTSUPP && errno != EISDIR && errno != EINVAL) {
+			int err = errno;
+			IE_LOG_E("Cannot create a file in %s: %s", save_dir, strerror(err));
+			return err;
+		}
+	}
+	int err = _work_dir_create(folder, &scratch->work);
+	if (err) {
+		IE_LOG_E("Cannot create a private directory in %s: %s", save_dir, strerror(err));
+		return err;
+	}
+	return _scratch_file_create(*scratch, WORK_PICTURE, picture);
+}
+
+void _scratch_close(Scratch *scratch)
+{
+	if (!scratch->unnamed())
+		_work_dir_remove(scratch->folder, &scratch->work);
 }
 
 /* ---- Writing --------------------------------------------------------- */
@@ -382,23 +461,34 @@ Evas_Object *_save_flattened_copy(Evas_Object *img)
 
 /* The encoder reports no cause: its errno if it tells, else a full
  * storage if the room left says so. */
-int _save_encoder_error(int encoder_errno, int work_fd)
+int _save_encoder_error(int encoder_errno, int fd)
 {
 	if (encoder_errno == ENOSPC || encoder_errno == EDQUOT)
 		return encoder_errno;
 	struct statvfs st;
-	if (fstatvfs(work_fd, &st) == 0 && !ie_save_free_space_enough(&st))
+	if (fstatvfs(fd, &st) == 0 && !ie_save_free_space_enough(&st))
 		return ENOSPC;
 	return encoder_errno ? encoder_errno : EIO;
 }
 
-/* Has Evas's saver write `img` as WORK_PICTURE inside the private
- * directory, reached through its descriptor so the path cannot lead
- * anywhere else. Returns 0 or an errno value. */
-int _save_encode(Evas_Object *img, const WorkDir &work)
+/* Has Evas's saver write `img` into the scratch file `picture` through a
+ * name in a private directory, so that the path leads nowhere else.
+ * Returns 0 or an errno value. */
+int _save_encode(Evas_Object *img, const Scratch &scratch, int picture)
 {
 	char target[64];
-	snprintf(target, sizeof(target), "/proc/self/fd/%d/%s", work.fd, WORK_PICTURE);
+	if (scratch.unnamed()) {
+		char unnamed[32];
+		snprintf(unnamed, sizeof(unnamed), "/proc/self/fd/%d", picture);
+		unlinkat(link_dir.fd, WORK_PICTURE, 0);
+		if (symlinkat(unnamed, link_dir.fd, WORK_PICTURE) != 0) {
+			int err = errno;
+			IE_LOG_E("Cannot reach the picture's file: %s", strerror(err));
+			return err;
+		}
+	}
+	snprintf(target, sizeof(target), "/proc/self/fd/%d/%s", scratch.unnamed() ? link_dir.fd : scratch.work.fd,
+		 WORK_PICTURE);
 	Eina_Bool had_alpha = evas_object_image_alpha_get(img);
 	Evas_Object *flat = nullptr;
 	if (had_alpha) {
@@ -413,6 +503,8 @@ int _save_encode(Evas_Object *img, const WorkDir &work)
 	errno = 0;
 	Eina_Bool written = evas_object_image_save(flat ? flat : img, target, nullptr, nullptr);
 	int encoder_errno = errno;
+	if (scratch.unnamed())
+		unlinkat(link_dir.fd, WORK_PICTURE, 0);
 	// The flag tells whether the picture has alpha, for the next save too.
 	if (flat)
 		evas_object_del(flat);
@@ -420,7 +512,7 @@ int _save_encode(Evas_Object *img, const WorkDir &work)
 		evas_object_image_alpha_set(img, EINA_FALSE);
 	if (written)
 		return 0;
-	int err = _save_encoder_error(encoder_errno, work.fd);
+	int err = _save_encoder_error(encoder_errno, picture);
 	IE_LOG_E("Cannot write the picture in %s: %s", save_dir, strerror(err));
 	return err;
 }
@@ -446,7 +538,7 @@ bool _save_write_all(int fd, const char *data, size_t len)
  * start (and JFIF header). Returns 0 or an errno value; `output` stays
  * closed when the encoder's file cannot take the metadata, which is then
  * left out. */
-int _save_add_metadata(int picture_fd, off_t size, const WorkDir &work, const std::string &metadata, Fd *output)
+int _save_add_metadata(int picture_fd, off_t size, const Scratch &scratch, const std::string &metadata, Fd *output)
 {
 	std::string jpeg(static_cast<size_t>(size), '\0');
 	for (size_t done = 0; done < jpeg.size();) {
@@ -471,11 +563,13 @@ int _save_add_metadata(int picture_fd, off_t size, const WorkDir &work, const st
 		if (app0_end <= jpeg.size())
 			insert_at = app0_end;
 	}
-	output->reset(openat(work.fd, WORK_OUTPUT, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0666));
-	if (!*output || !_save_write_all(output->get(), jpeg.data(), insert_at) ||
+	int err = _scratch_file_create(scratch, WORK_OUTPUT, output);
+	if (err)
+		return err;
+	if (!_save_write_all(output->get(), jpeg.data(), insert_at) ||
 	    !_save_write_all(output->get(), metadata.data(), metadata.size()) ||
 	    !_save_write_all(output->get(), jpeg.data() + insert_at, jpeg.size() - insert_at)) {
-		int err = errno;
+		err = errno;
 		IE_LOG_E("Cannot write the picture in %s: %s", save_dir, strerror(err));
 		return err;
 	}
@@ -498,13 +592,24 @@ int _save_rename_noreplace(int from_dir, const char *from, int to_dir, const cha
 	return 0;
 }
 
-/* Publishes `work_name` (open as `file_fd`) under save_path, or under the
- * next free name when that one was taken since it was chosen, and checks
- * that the name now holds that very file. Returns 0 or an errno value. */
-int _save_publish(int folder, const WorkDir &work, const char *work_name, int file_fd)
+/* Gives the scratch file `fd` (`work_name` in a private directory) the
+ * name `final_name` in the folder, only if that name is free. */
+int _scratch_publish(const Scratch &scratch, const char *work_name, int fd, const char *final_name)
+{
+	if (!scratch.unnamed())
+		return _save_rename_noreplace(scratch.work.fd, work_name, scratch.folder, final_name);
+	char unnamed[32];
+	snprintf(unnamed, sizeof(unnamed), "/proc/self/fd/%d", fd);
+	return linkat(AT_FDCWD, unnamed, scratch.folder, final_name, AT_SYMLINK_FOLLOW);
+}
+
+/* Publishes the scratch file `fd` under save_path, or under the next free
+ * name when that one was taken since it was chosen, and checks that the
+ * name now holds that very file. Returns 0 or an errno value. */
+int _save_publish(const Scratch &scratch, const char *work_name, int fd)
 {
 	struct stat written;
-	if (fstat(file_fd, &written) != 0) {
+	if (fstat(fd, &written) != 0) {
 		int err = errno;
 		IE_LOG_E("Cannot publish %s: %s", save_path, strerror(err));
 		return err;
@@ -512,7 +617,7 @@ int _save_publish(int folder, const WorkDir &work, const char *work_name, int fi
 	char final_name[SAVE_BUF_LEN + sizeof(SAVE_EXT)];
 	for (;;) {
 		snprintf(final_name, sizeof(final_name), "%s%s", save_name, SAVE_EXT);
-		if (_save_rename_noreplace(work.fd, work_name, folder, final_name) == 0)
+		if (_scratch_publish(scratch, work_name, fd, final_name) == 0)
 			break;
 		if (errno != EEXIST) {
 			int err = errno;
@@ -524,31 +629,30 @@ int _save_publish(int folder, const WorkDir &work, const char *work_name, int fi
 			return EEXIST;
 	}
 	struct stat published;
-	if (fstatat(folder, final_name, &published, AT_SYMLINK_NOFOLLOW) != 0 || !S_ISREG(published.st_mode) ||
-	    published.st_dev != written.st_dev || published.st_ino != written.st_ino) {
+	if (fstatat(scratch.folder, final_name, &published, AT_SYMLINK_NOFOLLOW) != 0 ||
+	    !S_ISREG(published.st_mode) || published.st_dev != written.st_dev || published.st_ino != written.st_ino) {
 		IE_LOG_E("%s was replaced as it was published: %s", save_path, strerror(EEXIST));
 		return EEXIST;
 	}
-	if (fsync(folder) != 0)
+	if (fsync(scratch.folder) != 0)
 		IE_LOG_W("Cannot flush directory %s: %s", save_dir, strerror(errno));
 	return 0;
 }
 
-/* Encodes, adds the source's metadata, flushes and publishes, all inside
- * `work`. Returns 0 or an errno value. */
-int _save_write_and_publish(Evas_Object *img, int folder, const WorkDir &work)
+/* Encodes, adds the source's metadata, flushes and publishes. Returns 0 or
+ * an errno value. */
+int _save_write_and_publish(Evas_Object *img, const Scratch &scratch, int picture)
 {
-	int err = _save_encode(img, work);
+	int err = _save_encode(img, scratch, picture);
 	if (err)
 		return err;
-	Fd picture(openat(work.fd, WORK_PICTURE, O_RDONLY | O_NOFOLLOW | O_CLOEXEC));
 	struct stat st;
-	if (!picture || fstat(picture.get(), &st) != 0) {
+	if (fstat(picture, &st) != 0) {
 		err = errno;
 		IE_LOG_E("Cannot read the written picture back: %s", strerror(err));
 		return err;
 	}
-	if (!S_ISREG(st.st_mode) || st.st_size <= 0) {
+	if (st.st_size <= 0) {
 		IE_LOG_E("Cannot read the written picture back: %s", strerror(EIO));
 		return EIO;
 	}
@@ -558,19 +662,19 @@ int _save_write_and_publish(Evas_Object *img, int folder, const WorkDir &work)
 	std::string metadata = ie_save_metadata_segments(save_source, w, h, time(nullptr));
 	Fd output;
 	if (!metadata.empty()) {
-		err = _save_add_metadata(picture.get(), st.st_size, work, metadata, &output);
+		err = _save_add_metadata(picture, st.st_size, scratch, metadata, &output);
 		if (err)
 			return err;
 	}
 	const char *name = output ? WORK_OUTPUT : WORK_PICTURE;
-	int fd = output ? output.get() : picture.get();
+	int fd = output ? output.get() : picture;
 	// The saver neither syncs nor checks its final flush.
 	if (fsync(fd) != 0) {
 		err = errno;
 		IE_LOG_E("Cannot flush the picture in %s: %s", save_dir, strerror(err));
 		return err;
 	}
-	return _save_publish(folder, work, name, fd);
+	return _save_publish(scratch, name, fd);
 }
 
 /* Returns 0 or an errno value. */
@@ -586,13 +690,12 @@ int _save_image_file(Evas_Object *img)
 		IE_LOG_E("Cannot open the folder %s: %s", save_dir, strerror(err));
 		return err;
 	}
-	_work_dirs_remove_stale(folder.get());
-	WorkDir work;
-	int err = _work_dir_create(folder.get(), &work);
-	if (err)
-		return err;
-	err = _save_write_and_publish(img, folder.get(), work);
-	_work_dir_remove(folder.get(), &work);
+	Scratch scratch;
+	Fd picture;
+	int err = _scratch_open(folder.get(), &scratch, &picture);
+	if (!err)
+		err = _save_write_and_publish(img, scratch, picture.get());
+	_scratch_close(&scratch);
 	return err;
 }
 
@@ -622,6 +725,11 @@ void _save_init(const char *filepath)
 const char *ie_save_path_get(void)
 {
 	return save_path;
+}
+
+void ie_save_unnamed_files_set(Eina_Bool enabled)
+{
+	save_unnamed_files = enabled;
 }
 
 Eina_Bool get_internal_memory_status(struct statvfs *st)
