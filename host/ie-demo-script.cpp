@@ -64,6 +64,27 @@ bool tap_funcbar_button(Demo_Script *s, const char *part)
 	return funcbar && tap_object(s->win, elm_object_part_content_get(funcbar, part));
 }
 
+/* Done saves and comes back at once; the editor then waits, Done disabled
+ * and no popup up, until the saved file is registered. */
+bool save_pending(Demo_Script *s)
+{
+	Evas_Object *funcbar = elm_object_part_content_get(s->editor_view, "elm.swallow.tabbar");
+	Evas_Object *done = funcbar ? elm_object_part_content_get(funcbar, "title_right_text_btn") : nullptr;
+	Evas *e = evas_object_evas_get(s->win);
+	return !*s->closed && done && elm_object_disabled_get(done) && !evas_object_name_find(e, "okcancelpopup") &&
+	       !evas_object_name_find(e, "savefailedpopup");
+}
+
+bool tap_done(Demo_Script *s)
+{
+	if (!tap_funcbar_button(s, "title_right_text_btn"))
+		return false;
+	loop_for(0.05);
+	for (int tries = 0; tries < 400 && save_pending(s); tries++)
+		loop_for(0.05);
+	return true;
+}
+
 bool tap_popup_button(Demo_Script *s, const char *popup_name, const char *part)
 {
 	Evas_Object *popup = evas_object_name_find(evas_object_evas_get(s->win), popup_name);
@@ -344,11 +365,13 @@ constexpr Action actions_table[] = {
 	 [](Demo_Script *s, const std::string &arg) { return arg.empty() ? tap_tool(s, 3) : tap_effect(s, arg); }},
 	{"intensity", [](Demo_Script *s, const std::string &arg) { return drag_intensity(s, arg); }},
 	{"cancel", [](Demo_Script *s, const std::string &) { return tap_funcbar_button(s, "title_left_text_btn"); }},
-	{"done", [](Demo_Script *s, const std::string &) { return tap_funcbar_button(s, "title_right_text_btn"); }},
+	{"done", [](Demo_Script *s, const std::string &) { return tap_done(s); }},
 	{"discard", [](Demo_Script *s, const std::string &) { return tap_popup_button(s, "deletepopup", "button2"); }},
 	{"keep", [](Demo_Script *s, const std::string &) { return tap_popup_button(s, "deletepopup", "button1"); }},
 	{"storage-ok",
 	 [](Demo_Script *s, const std::string &) { return tap_popup_button(s, "okcancelpopup", "button1"); }},
+	{"failed-ok",
+	 [](Demo_Script *s, const std::string &) { return tap_popup_button(s, "savefailedpopup", "button1"); }},
 	{"back", [](Demo_Script *s, const std::string &) { return press_back(s); }},
 	{"drag", drag_crop_box},
 	{"pinch", pinch_picture},
@@ -381,8 +404,8 @@ bool picture_ready(Demo_Script *s)
 
 const char *demo_actions_help(void)
 {
-	return "crop rotate-left rotate-right effect effect:NAME intensity:DX cancel done discard keep storage-ok back "
-	       "drag:PART:DX:DY pinch:FACTOR";
+	return "crop rotate-left rotate-right effect effect:NAME intensity:DX cancel done discard keep storage-ok "
+	       "failed-ok back drag:PART:DX:DY pinch:FACTOR";
 }
 
 bool demo_script_run(Demo_Script *s, const std::vector<std::string> &actions)

@@ -2,6 +2,7 @@
 
 #include <libexif/exif-data.h>
 #include <sqlite3.h>
+#include <libexif/exif-data.h>
 
 #include <cerrno>
 #include <cstdint>
@@ -17,7 +18,7 @@
 namespace {
 
 constexpr char default_db_path[] = "/var/lib/editor-svc-platform/media.db";
-constexpr int busy_timeout_ms = 5000;
+constexpr int default_busy_timeout_ms = 5000;
 
 constexpr char schema[] =
 	"CREATE TABLE IF NOT EXISTS media ("
@@ -26,7 +27,8 @@ constexpr char schema[] =
 	" size INTEGER NOT NULL,"
 	" width INTEGER NOT NULL,"
 	" height INTEGER NOT NULL,"
-	" modified_time INTEGER NOT NULL)";
+	" modified_time INTEGER NOT NULL,"
+	" date_taken TEXT)";
 
 /* ---- Content sniffing ------------------------------------------------ */
 
@@ -245,6 +247,31 @@ Sniff sniff(FILE *file, long long file_size, MediaInfo *info)
 	return Sniff::not_media;
 }
 
+struct ExifDataUnref {
+	void operator()(ExifData *data) const { exif_data_unref(data); }
+};
+
+// DateTimeOriginal of a photograph's EXIF block as "YYYY-MM-DD HH:MM:SS",
+// or "" when it has none or it is not a date.
+std::string exif_date_taken(const char *path)
+{
+	std::unique_ptr<ExifData, ExifDataUnref> exif(exif_data_new_from_file(path));
+	ExifEntry *entry = exif ? exif_content_get_entry(exif->ifd[EXIF_IFD_EXIF], EXIF_TAG_DATE_TIME_ORIGINAL)
+				: nullptr;
+	constexpr char shape[] = "dddd:dd:dd dd:dd:dd";
+	constexpr size_t len = sizeof(shape) - 1;
+	if (!entry || entry->format != EXIF_FORMAT_ASCII || entry->size < len)
+		return {};
+	std::string date(reinterpret_cast<const char *>(entry->data), len);
+	for (size_t i = 0; i < len; i++) {
+		bool digit = date[i] >= '0' && date[i] <= '9';
+		if (shape[i] == 'd' ? !digit : date[i] != shape[i])
+			return {};
+	}
+	date[4] = date[7] = '-';
+	return date;
+}
+
 /* ---- Database -------------------------------------------------------- */
 
 struct DbCloser {
@@ -288,6 +315,25 @@ int db_error(int sqlite_result)
 	return MEDIA_DB_ERROR_DB_FAILED;
 }
 
+int busy_timeout()
+{
+	const char *value = getenv("MEDIA_DB_BUSY_TIMEOUT_MS");
+	char *end = nullptr;
+	long ms = value ? strtol(value, &end, 10) : -1;
+	return (value && *value && !*end && ms >= 0 && ms <= INT32_MAX) ? static_cast<int>(ms) : default_busy_timeout_ms;
+}
+
+// Databases made before the date taken was recorded get its column.
+int add_date_taken_column(sqlite3 *db)
+{
+	sqlite3_stmt *raw = nullptr;
+	int rc = sqlite3_prepare_v2(db, "SELECT date_taken FROM media LIMIT 0", -1, &raw, nullptr);
+	sqlite3_finalize(raw);
+	if (rc == SQLITE_OK)
+		return SQLITE_OK;
+	return sqlite3_exec(db, "ALTER TABLE media ADD COLUMN date_taken TEXT", nullptr, nullptr, nullptr);
+}
+
 int open_db(Db *out)
 {
 	std::string path = db_path();
@@ -299,10 +345,12 @@ int open_db(Db *out)
 	Db db(raw);
 	if (rc != SQLITE_OK)
 		return db_error(rc);
-	sqlite3_busy_timeout(db.get(), busy_timeout_ms);
+	sqlite3_busy_timeout(db.get(), busy_timeout());
 	rc = sqlite3_exec(db.get(), "PRAGMA journal_mode=WAL", nullptr, nullptr, nullptr);
 	if (rc == SQLITE_OK)
 		rc = sqlite3_exec(db.get(), schema, nullptr, nullptr, nullptr);
+	if (rc == SQLITE_OK)
+		rc = add_date_taken_column(db.get());
 	if (rc != SQLITE_OK)
 		return db_error(rc);
 	*out = std::move(db);
@@ -321,20 +369,24 @@ int use_db(Db *local, sqlite3 **db)
 	return result;
 }
 
-// Rows are keyed by absolute path, so a relative path is taken from the
-// working directory, the way the caller meant it.
-bool absolute_path(const char *path, std::string *out)
+// Rows are keyed by canonical absolute path, so that one file has one row
+// however it is named; a relative path is taken from the working
+// directory, the way the caller meant it. A path that does not resolve
+// (a file since removed) is made absolute and normalised as text.
+bool canonical_path(const char *path, std::string *out)
 {
 	if (!path || !*path)
 		return false;
-	if (path[0] == '/') {
-		*out = path;
+	if (char *resolved = realpath(path, nullptr)) {
+		*out = resolved;
+		free(resolved);
 		return true;
 	}
-	char cwd[4096];
-	if (!getcwd(cwd, sizeof(cwd)))
+	std::error_code error;
+	std::filesystem::path absolute = std::filesystem::absolute(path, error);
+	if (error)
 		return false;
-	*out = std::string(cwd) + "/" + path;
+	*out = absolute.lexically_normal().string();
 	return true;
 }
 
@@ -363,7 +415,7 @@ extern "C" int media_db_close(void)
 extern "C" int media_content_scan_file(const char *path)
 {
 	std::string full_path;
-	if (!absolute_path(path, &full_path))
+	if (!canonical_path(path, &full_path))
 		return MEDIA_DB_ERROR_INVALID_PARAMETER;
 
 	File file(fopen(full_path.c_str(), "rb"));
@@ -376,6 +428,7 @@ extern "C" int media_content_scan_file(const char *path)
 	if (sniff(file.get(), st.st_size, &info) != Sniff::media)
 		return MEDIA_DB_ERROR_INVALID_PARAMETER;
 	file.reset();
+	std::string date_taken = strcmp(info.mime, "image/jpeg") == 0 ? exif_date_taken(full_path.c_str()) : "";
 
 	Db local;
 	sqlite3 *db;
@@ -384,10 +437,10 @@ extern "C" int media_content_scan_file(const char *path)
 		return result;
 	sqlite3_stmt *raw = nullptr;
 	int rc = sqlite3_prepare_v2(db,
-		"INSERT INTO media (path, mime_type, size, width, height, modified_time)"
-		" VALUES (?1, ?2, ?3, ?4, ?5, ?6)"
+		"INSERT INTO media (path, mime_type, size, width, height, modified_time, date_taken)"
+		" VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7)"
 		" ON CONFLICT (path) DO UPDATE SET mime_type = ?2, size = ?3, width = ?4,"
-		" height = ?5, modified_time = ?6",
+		" height = ?5, modified_time = ?6, date_taken = ?7",
 		-1, &raw, nullptr);
 	Stmt insert(raw);
 	if (rc != SQLITE_OK)
@@ -398,6 +451,8 @@ extern "C" int media_content_scan_file(const char *path)
 	sqlite3_bind_int(raw, 4, info.width);
 	sqlite3_bind_int(raw, 5, info.height);
 	sqlite3_bind_int64(raw, 6, st.st_mtime);
+	if (!date_taken.empty())
+		sqlite3_bind_text(raw, 7, date_taken.c_str(), -1, SQLITE_TRANSIENT);
 	rc = sqlite3_step(raw);
 	return rc == SQLITE_DONE ? MEDIA_DB_ERROR_NONE : db_error(rc);
 }
@@ -405,7 +460,7 @@ extern "C" int media_content_scan_file(const char *path)
 extern "C" int media_db_lookup(const char *path, Media_Db_Row *record)
 {
 	std::string full_path;
-	if (!record || !absolute_path(path, &full_path))
+	if (!record || !canonical_path(path, &full_path))
 		return MEDIA_DB_ERROR_INVALID_PARAMETER;
 
 	Db local;
@@ -415,7 +470,7 @@ extern "C" int media_db_lookup(const char *path, Media_Db_Row *record)
 		return result;
 	sqlite3_stmt *raw = nullptr;
 	int rc = sqlite3_prepare_v2(db,
-		"SELECT mime_type, size, width, height, modified_time FROM media WHERE path = ?1",
+		"SELECT mime_type, size, width, height, modified_time, date_taken FROM media WHERE path = ?1",
 		-1, &raw, nullptr);
 	Stmt select(raw);
 	if (rc != SQLITE_OK)
@@ -432,5 +487,8 @@ extern "C" int media_db_lookup(const char *path, Media_Db_Row *record)
 	record->width = sqlite3_column_int(raw, 2);
 	record->height = sqlite3_column_int(raw, 3);
 	record->modified_time = sqlite3_column_int64(raw, 4);
+	const unsigned char *date_taken = sqlite3_column_text(raw, 5);
+	snprintf(record->date_taken, sizeof(record->date_taken), "%s",
+		 date_taken ? reinterpret_cast<const char *>(date_taken) : "");
 	return MEDIA_DB_ERROR_NONE;
 }

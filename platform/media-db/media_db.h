@@ -1,6 +1,10 @@
 /* Media content: the platform's media database. A scan records a media
- * file's path, MIME type, size, pixel size and modification time in a
- * SQLite database ($MEDIA_DB_PATH, default /var/lib/editor-svc-platform/media.db). */
+ * file's canonical path, MIME type, size, pixel size, modification time
+ * and, for a photograph, the date it was taken, in a SQLite database
+ * ($MEDIA_DB_PATH, default /var/lib/editor-svc-platform/media.db). While
+ * another process writes to it, a call waits up to
+ * $MEDIA_DB_BUSY_TIMEOUT_MS milliseconds (default 5000), then gives
+ * MEDIA_DB_ERROR_DB_BUSY. */
 #ifndef MEDIA_DB_H
 #define MEDIA_DB_H
 
@@ -27,8 +31,9 @@ typedef enum {
 
 MEDIA_DB_API int media_db_open(void);
 MEDIA_DB_API int media_db_close(void);
-/* Inserts or updates the file's row; the MIME type and pixel size come
- * from the file's content, not its name. A missing file, a directory, or a
+/* Inserts or updates the file's row, keyed by its canonical absolute path
+ * (links, "." and ".." resolved); the MIME type, pixel size and date taken
+ * come from the file's content, not its name. A missing file, a directory, or a
  * file that is not a picture, video or sound (or whose picture header is
  * cut short) gives MEDIA_DB_ERROR_INVALID_PARAMETER and no row. Works
  * with or without a prior media_db_open(). */
@@ -41,9 +46,13 @@ typedef struct {
 	int width;
 	int height;
 	long long modified_time;
+	/* When the picture was taken (EXIF DateTimeOriginal), as
+	 * "YYYY-MM-DD HH:MM:SS", so that it sorts as text; "" when unknown. */
+	char date_taken[20];
 } Media_Db_Row;
 
-/* Reads the row of `path`: MEDIA_DB_ERROR_NONE and the record, or
+/* Reads the row of `path` (canonicalised as by a scan): MEDIA_DB_ERROR_NONE
+ * and the record, or
  * MEDIA_DB_ERROR_INVALID_OPERATION when there is none. */
 MEDIA_DB_API int media_db_lookup(const char *path, Media_Db_Row *record);
 

@@ -2,10 +2,14 @@
  * tree): the demo host drives the real editor with taps on its real widgets,
  * as a person would, and the saved file is checked on disk and in the media
  * database. */
+#include <sys/mount.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <cstdio>
+#include <cstring>
+#include <ctime>
 #include <filesystem>
 #include <fstream>
 #include <media_db.h>
@@ -13,6 +17,7 @@
 #include "ie-engine.h"
 
 #include "ie-test-harness.h"
+#include "ie-test-photo.h"
 #include "ie-test-pictures.h"
 
 namespace {
@@ -297,6 +302,63 @@ TEST_F(Demo, ADeepCheckoutStartsWithoutWaitingForTheDesktopDaemon)
 	EXPECT_EQ(status, 0) << output;
 	EXPECT_EQ(output.find("buffer overflow"), std::string::npos) << output;
 	EXPECT_EQ(output.find("efreetd"), std::string::npos) << output;
+}
+
+/* A photograph turned by its EXIF block, rotated right and saved: upright,
+ * with its metadata, its date taken in the media database. */
+TEST_F(Demo, APhotographKeepsItsMetadata)
+{
+	std::string dir = iet::temp_dir();
+	std::string photo = dir + "/camera.jpg";
+	ASSERT_TRUE(iet::write_photo(photo, 800, 600, 6));
+	long before = static_cast<long>(time(nullptr));
+	int status = 0;
+	std::string output = run_host(photo, "--do rotate-right --do done", &status);
+	ASSERT_EQ(status, 0) << output;
+	std::string path = saved_path(output);
+	ASSERT_EQ(path, dir + "/camera_e001.jpg") << output;
+	iet::expect_photo_metadata(path, 800, 600, before);
+
+	Evas_Object *check = evas_object_image_add(evas());
+	evas_object_image_load_orientation_set(check, EINA_TRUE);
+	evas_object_image_file_set(check, path.c_str(), nullptr);
+	int w = 0, h = 0;
+	evas_object_image_size_get(check, &w, &h);
+	ASSERT_EQ(w * 1000 + h, 800 * 1000 + 600);
+	/* Stored top left, the marked corner is turned twice to bottom right. */
+	auto *pixels = static_cast<const uint32_t *>(evas_object_image_data_get(check, EINA_FALSE));
+	ASSERT_NE(pixels, nullptr);
+	EXPECT_GT(pixels[(h - 6) * w + (w - 6)] & 0xff, 200u) << "marked corner";
+	EXPECT_LT(pixels[5 * w + 5] & 0xff, 160u);
+	evas_object_del(check);
+
+	Media_Db_Row row;
+	ASSERT_EQ(media_db_lookup(path.c_str(), &row), MEDIA_DB_ERROR_NONE);
+	EXPECT_STREQ(row.date_taken, "2021-07-14 09:30:05");
+}
+
+/* A save that fails keeps the editor open with its popup; its OK closes
+ * only the popup. */
+TEST_F(Demo, ASaveThatFailsKeepsTheEditorOpen)
+{
+	if (geteuid() != 0)
+		GTEST_SKIP() << "a read-only folder needs a mount, which needs root";
+	std::string dir = iet::temp_dir();
+	if (mount("tmpfs", dir.c_str(), "tmpfs", 0, "size=4m") != 0)
+		GTEST_SKIP() << "cannot mount a tmpfs here: " << strerror(errno);
+	std::string picture = dir + "/a.jpg";
+	bool written = iet::write_picture(picture, 320, 240);
+	bool read_only = mount(nullptr, dir.c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr) == 0;
+	int status = 0;
+	std::string output = written && read_only
+		? run_host(picture, "--do rotate-right --do done --do failed-ok --do cancel --do discard", &status)
+		: std::string();
+	umount2(dir.c_str(), MNT_DETACH);
+	ASSERT_TRUE(written && read_only);
+	EXPECT_EQ(status, 0) << output;
+	EXPECT_NE(output.find("step 3: failed-ok"), std::string::npos) << output;
+	EXPECT_NE(output.find("closed: nothing saved"), std::string::npos) << output;
+	EXPECT_EQ(output.find("saved: "), std::string::npos) << output;
 }
 
 } // namespace

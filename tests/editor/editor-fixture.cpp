@@ -28,8 +28,16 @@ Viewhandle *EditorTest::create_editor()
 Viewhandle *EditorTest::open_editor_on_picture(int w, int h, int rotation)
 {
 	picture_dir = iet::temp_dir();
-	picture_path = picture_dir + "/photo.jpg";
-	if (!iet::write_picture(picture_path, w, h, "quality=100") || !create_editor())
+	if (!iet::write_picture(picture_dir + "/photo.jpg", w, h, "quality=100"))
+		return nullptr;
+	return open_editor_on_file(picture_dir + "/photo.jpg", rotation);
+}
+
+Viewhandle *EditorTest::open_editor_on_file(const std::string &path, int rotation)
+{
+	picture_path = path;
+	picture_dir = path.substr(0, path.rfind('/'));
+	if (!create_editor())
 		return nullptr;
 	IE_setparam(vh, picture_path.c_str(), win_w, win_h, rotation);
 	iet::run_until([this] {
@@ -48,6 +56,11 @@ void EditorTest::destroy_editor()
 		vh = nullptr;
 	}
 	iet::run_idlers();
+}
+
+bool EditorTest::wait_for_close(double timeout)
+{
+	return iet::run_until([this] { return !close_requests.empty(); }, timeout);
 }
 
 void EditorTest::TearDown()

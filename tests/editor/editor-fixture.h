@@ -18,7 +18,13 @@ protected:
 	/* create_editor + a w x h JPEG written in a scratch directory +
 	 * IE_setparam, then the loop run until the picture is in place. */
 	Viewhandle *open_editor_on_picture(int w, int h, int rotation = 0);
+	/* create_editor + IE_setparam on `path`, then the loop run until the
+	 * picture is in place. */
+	Viewhandle *open_editor_on_file(const std::string &path, int rotation = 0);
 	void destroy_editor();
+	/* Runs the loop until the editor asks to be closed (a save registers
+	 * its file before it does); whether it did within `timeout` seconds. */
+	bool wait_for_close(double timeout = 10.0);
 
 	Evas_Object *inner_image() const;
 	void picture_size(int *w, int *h) const;

@@ -284,6 +284,7 @@ TEST_F(CropView, DoneCropsThePictureAndTheNextDoneSavesIt)
 	EXPECT_TRUE(p.w == 720 || p.x == (720 - p.w) / 2) << p.x << " " << p.w;
 
 	tap_button(vh->done_btn);
+	ASSERT_TRUE(wait_for_close());
 	ASSERT_EQ(close_requests.size(), 1u);
 	const std::string saved = close_requests[0];
 	ASSERT_EQ(saved, picture_dir + "/photo_e001.jpg");
@@ -326,6 +327,7 @@ TEST_F(CropView, AnAppliedCropIsNeverForgotten)
 
 	tap_button(elm_object_part_content_get(vh->popup, "button1"));
 	tap_button(vh->done_btn);
+	ASSERT_TRUE(wait_for_close());
 	ASSERT_EQ(close_requests.size(), 1u);
 	Evas_Object *check = evas_object_image_add(evas());
 	evas_object_image_file_set(check, close_requests[0].c_str(), nullptr);

@@ -397,7 +397,7 @@ TEST_F(EffectView, DoneAfterAnEffectAndADragSavesTheBlend)
 	ASSERT_EQ(shown, blend(effect(ROW_SUNSHINE), unedited, w, h, 90));
 
 	iet::tap_object(vh->done_btn);
-	iet::settle();
+	ASSERT_TRUE(wait_for_close());
 	ASSERT_EQ(close_requests.size(), 1u);
 	std::string path = close_requests[0];
 	EXPECT_EQ(path, picture_dir + "/photo_e001.jpg");

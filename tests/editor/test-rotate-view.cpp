@@ -86,6 +86,8 @@ TEST_F(RotateView, ExtremeShapesRotateAndSave)
 		EXPECT_EQ(rh, w);
 		std::string expected = ie_save_path_get();
 		iet::tap_object(vh->done_btn);
+		// The editor closes once the saved file is registered.
+		iet::run_until([this] { return !close_requests.empty(); });
 		ASSERT_EQ(close_requests.size(), 1u) << w << "x" << h;
 		EXPECT_EQ(close_requests[0], expected);
 		Evas_Object *check = evas_object_image_add(evas());

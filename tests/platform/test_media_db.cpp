@@ -3,13 +3,16 @@
 #include <sqlite3.h>
 
 #include <cstdlib>
+#include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <string>
 #include <sys/stat.h>
+#include <unistd.h>
 #include <vector>
 
 #include "ie-test-harness.h"
+#include "ie-test-photo.h"
 #include "ie-test-pictures.h"
 
 namespace {
@@ -141,4 +144,63 @@ TEST_F(MediaContent, MissingNonMediaAndTruncatedFilesAreRefused)
 	}
 	EXPECT_EQ(media_content_scan_file(nullptr), MEDIA_DB_ERROR_INVALID_PARAMETER);
 	EXPECT_EQ(media_content_scan_file(""), MEDIA_DB_ERROR_INVALID_PARAMETER);
+}
+
+/* One file has one row whatever path names it: relative, with "." or
+ * "..", or through a link; a lookup finds it by any of them. */
+TEST_F(MediaContent, RowsAreKeyedByTheCanonicalPath)
+{
+	std::filesystem::create_directories(dir + "/pics");
+	std::string photo = dir + "/pics/p.jpg";
+	ASSERT_TRUE(iet::write_picture(photo, 16, 8));
+	ASSERT_EQ(symlink((dir + "/pics").c_str(), (dir + "/link").c_str()), 0);
+	std::string cwd = std::filesystem::current_path();
+	std::filesystem::current_path(dir);
+	for (const char *path : {"pics/./p.jpg", "pics/../pics/p.jpg", "link/p.jpg"})
+		EXPECT_EQ(media_content_scan_file(path), MEDIA_DB_ERROR_NONE) << path;
+	Media_Db_Row record = {};
+	EXPECT_EQ(media_db_lookup("./pics//p.jpg", &record), MEDIA_DB_ERROR_NONE);
+	std::filesystem::current_path(cwd);
+
+	sqlite3 *db = nullptr;
+	ASSERT_EQ(sqlite3_open_v2(db_path.c_str(), &db, SQLITE_OPEN_READONLY, nullptr), SQLITE_OK);
+	std::vector<std::string> keys;
+	auto collect = [](void *out, int, char **values, char **) {
+		static_cast<std::vector<std::string> *>(out)->push_back(values[0]);
+		return 0;
+	};
+	EXPECT_EQ(sqlite3_exec(db, "SELECT path FROM media", collect, &keys, nullptr), SQLITE_OK);
+	sqlite3_close(db);
+	char *canonical = realpath(photo.c_str(), nullptr);
+	EXPECT_EQ(keys, std::vector<std::string>{canonical});
+	free(canonical);
+}
+
+/* A photograph's row carries when it was taken, so that a viewer can sort
+ * by it; a database made before that column existed gains it. */
+TEST_F(MediaContent, RowsCarryTheDateTaken)
+{
+	std::filesystem::create_directories(dir + "/db/new");
+	sqlite3 *db = nullptr;
+	ASSERT_EQ(sqlite3_open(db_path.c_str(), &db), SQLITE_OK);
+	ASSERT_EQ(sqlite3_exec(db,
+			       "CREATE TABLE media (path TEXT PRIMARY KEY NOT NULL, mime_type TEXT NOT NULL,"
+			       " size INTEGER NOT NULL, width INTEGER NOT NULL, height INTEGER NOT NULL,"
+			       " modified_time INTEGER NOT NULL)",
+			       nullptr, nullptr, nullptr),
+		  SQLITE_OK);
+	sqlite3_close(db);
+
+	std::string photo = dir + "/camera.jpg", png = dir + "/plain.png", undated = dir + "/undated.jpg";
+	ASSERT_TRUE(iet::write_photo(photo, 32, 24, 1));
+	ASSERT_TRUE(iet::write_picture(png, 32, 24));
+	ASSERT_TRUE(iet::write_picture(undated, 32, 24));
+	const std::pair<std::string, const char *> expected[] = {
+		{photo, "2021-07-14 09:30:05"}, {png, ""}, {undated, ""}};
+	for (const auto &[path, date] : expected) {
+		ASSERT_EQ(media_content_scan_file(path.c_str()), MEDIA_DB_ERROR_NONE) << path;
+		Media_Db_Row record = {};
+		ASSERT_EQ(media_db_lookup(path.c_str(), &record), MEDIA_DB_ERROR_NONE) << path;
+		EXPECT_STREQ(record.date_taken, date) << path;
+	}
 }

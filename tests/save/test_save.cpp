@@ -6,23 +6,39 @@
 #include <media_db.h>
 
 #include <cerrno>
+#include <fcntl.h>
 #include <cstdio>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
+#include <memory>
 #include <set>
+#include <dirent.h>
+#include <grp.h>
+#include <pwd.h>
+#include <signal.h>
+#include <sys/mman.h>
+#include <sys/file.h>
 #include <sys/mount.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <jpeglib.h>
+#include <random>
 
 #include "ie-save-private.h"
 #include "ie-save.h"
+#include "ie-test-photo.h"
 
 namespace fs = std::filesystem;
 
 namespace {
+
+struct FreeDeleter {
+	void operator()(char *text) const { free(text); }
+};
+using CString = std::unique_ptr<char, FreeDeleter>;
 
 std::string read_bytes(const std::string &path)
 {
@@ -41,6 +57,21 @@ std::set<std::string> entries(const std::string &dir)
 	for (const auto &entry : fs::directory_iterator(dir))
 		names.insert(entry.path().filename().string());
 	return names;
+}
+
+std::string euros(int count)
+{
+	std::string text;
+	for (int i = 0; i < count; i++)
+		text += "\u20AC";
+	return text;
+}
+
+mode_t current_umask()
+{
+	mode_t mask = umask(0);
+	umask(mask);
+	return mask;
 }
 
 bool enough(unsigned long bsize, fsblkcnt_t bavail)
@@ -69,6 +100,7 @@ protected:
 		if (!created_dir.empty())
 			fs::remove_all(created_dir, ignored);
 		setenv("STORAGE_INTERNAL_ROOT", internal_root.c_str(), 1);
+		ie_save_unnamed_files_set(EINA_TRUE);
 		iet::EflTest::TearDown();
 	}
 
@@ -104,6 +136,14 @@ protected:
 		return saved;
 	}
 
+	static int error_lines_naming(const std::string &text)
+	{
+		int count = 0;
+		for (const iet::LogLine &line : iet::log_lines())
+			count += line.priority == PLATFORM_LOG_ERROR && line.text.find(text) != std::string::npos;
+		return count;
+	}
+
 	std::string dir, internal_root, created_dir;
 	std::vector<std::string> mounts;
 };
@@ -119,6 +159,11 @@ TEST_F(SaveTest, PicksFirstFreeCounterBesideSourceCuttingLongNames)
 		{"holiday", "holiday_e001.jpg"},
 		{std::string(239, 'x') + ".png", std::string(239, 'x') + "_e001.jpg"},
 		{std::string(240, 'y') + ".png", std::string(234, 'y') + "_e001.jpg"},
+		// A name that is all extension is the whole base name.
+		{".jpg", ".jpg_e001.jpg"},
+		{".photo", ".photo_e001.jpg"},
+		// The cut never splits a character: 1 + 80 x 3 bytes cut to 232.
+		{"a" + euros(80) + ".png", "a" + euros(77) + "_e001.jpg"},
 	};
 	for (const auto &[source, expected] : cases) {
 		_save_init((dir + "/" + source).c_str());
@@ -193,18 +238,21 @@ TEST_F(SaveTest, WritesAFreshJpegWithoutReplacingAnything)
 	write_bytes(dir + "/a_e001.jpg", "someone else's");
 	ASSERT_EQ(symlink((dir + "/nowhere").c_str(), (dir + "/a_e002.jpg").c_str()), 0);
 
-	std::string path = save(64, 48);
+	Evas_Object *img = picture(64, 48);
+	Eina_Bool memory_full = EINA_FALSE;
+	CString saved(_save_to_file(img, &memory_full));
+	ASSERT_NE(saved, nullptr);
+	std::string path = saved.get();
+	// Still opaque: a later save must not take it for a picture with alpha.
+	EXPECT_FALSE(evas_object_image_alpha_get(img));
 	EXPECT_EQ(path, dir + "/a_e003.jpg");
 	EXPECT_EQ(entries(dir), (std::set<std::string>{"a.png", "a_e001.jpg", "a_e002.jpg", "a_e003.jpg"}));
 	EXPECT_EQ(read_bytes(source), source_bytes);
 	EXPECT_EQ(read_bytes(dir + "/a_e001.jpg"), "someone else's");
 	EXPECT_FALSE(fs::exists(dir + "/nowhere"));
-
-	Media_Db_Row record;
-	ASSERT_EQ(media_db_lookup(path.c_str(), &record), MEDIA_DB_ERROR_NONE);
-	EXPECT_STREQ(record.mime_type, "image/jpeg");
-	EXPECT_EQ(record.width, 64);
-	EXPECT_EQ(record.height, 48);
+	struct stat st;
+	ASSERT_EQ(stat(path.c_str(), &st), 0);
+	EXPECT_EQ(st.st_mode & 0777, 0666u & ~current_umask()) << "the mode of any new file";
 }
 
 /* The picture is written with the saver's own default quality (80): its
@@ -282,32 +330,309 @@ TEST_F(SaveTest, FailedWritesLeaveTheDirectoryAsItWas)
 	_save_init(source.c_str());
 	allow_efl_error("Image save failed.");
 
-	// The card fills up in the middle of the JPEG; then it turns read-only.
-	EXPECT_EQ(save(600, 600), "");
+	// The card fills up in the middle of the JPEG: that is a full storage.
+	iet::log_clear();
+	EXPECT_EQ(save(600, 600, true), "");
+	EXPECT_EQ(error_lines_naming(strerror(ENOSPC)), 1);
+	EXPECT_EQ(entries(card), std::set<std::string>{"a.png"});
+	// Turned read-only, it is another failure, logged once with its cause.
 	ASSERT_EQ(mount(nullptr, card.c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr), 0);
+	iet::log_clear();
 	EXPECT_EQ(save(), "");
+	EXPECT_EQ(error_lines_naming(strerror(EROFS)), 1);
+	EXPECT_EQ(iet::log_lines().size(), 1u);
 	EXPECT_EQ(entries(card), std::set<std::string>{"a.png"});
 	EXPECT_EQ(read_bytes(source), source_bytes);
 	Media_Db_Row record;
 	EXPECT_NE(media_db_lookup((card + "/a_e001.jpg").c_str(), &record), MEDIA_DB_ERROR_NONE);
 }
 
-TEST_F(SaveTest, MediaDatabaseFailureKeepsTheFile)
+/* Registration runs off the main loop and reports back on it, once, with
+ * the path; a refused registration is logged and keeps the file. */
+TEST_F(SaveTest, RegistrationReportsBackOnTheMainLoop)
 {
+	_save_init((dir + "/a.png").c_str());
+	std::string path = save(40, 30);
+	ASSERT_FALSE(path.empty());
+	std::vector<std::string> delivered;
+	auto collect = [](void *data, char *saved) {
+		static_cast<std::vector<std::string> *>(data)->push_back(saved);
+		free(saved);
+	};
+	ie_save_register(strdup(path.c_str()), collect, &delivered);
+	EXPECT_TRUE(delivered.empty()) << "never before ie_save_register returns";
+	ASSERT_TRUE(iet::run_until([&] { return !delivered.empty(); }));
+	iet::run_for(0.05);
+	EXPECT_EQ(delivered, std::vector<std::string>{path});
+	Media_Db_Row record;
+	ASSERT_EQ(media_db_lookup(path.c_str(), &record), MEDIA_DB_ERROR_NONE);
+	EXPECT_STREQ(record.mime_type, "image/jpeg");
+	EXPECT_EQ(record.width, 40);
+	EXPECT_EQ(record.height, 30);
+	EXPECT_EQ(iet::log_count("Fail to register new edited file to DB : " +
+				 std::to_string(MEDIA_DB_ERROR_DB_FAILED), PLATFORM_LOG_WARN), 0);
+
+	// A database whose directory is a plain file cannot be opened.
 	const char *db = getenv("MEDIA_DB_PATH");
 	std::string saved_db = db ? db : "";
-	// A database whose directory is a plain file cannot be opened.
 	write_bytes(dir + "/not-a-dir", "");
 	setenv("MEDIA_DB_PATH", (dir + "/not-a-dir/media.db").c_str(), 1);
-	_save_init((dir + "/a.png").c_str());
-	std::string path = save();
+	delivered.clear();
+	ie_save_register(strdup(path.c_str()), collect, &delivered);
+	EXPECT_TRUE(iet::run_until([&] { return !delivered.empty(); }));
 	setenv("MEDIA_DB_PATH", saved_db.c_str(), 1);
+	EXPECT_EQ(delivered, std::vector<std::string>{path});
 	EXPECT_TRUE(fs::exists(path));
-	int warnings = 0;
-	for (const iet::LogLine &line : iet::log_lines())
-		warnings += line.priority == PLATFORM_LOG_WARN &&
-			    line.text.find("Fail to register new edited file to DB : ") != std::string::npos;
-	EXPECT_EQ(warnings, 1);
+	EXPECT_EQ(iet::log_count("Fail to register new edited file to DB : " +
+				 std::to_string(MEDIA_DB_ERROR_DB_FAILED), PLATFORM_LOG_WARN), 1);
+
+	// Abandoned: the callback never runs, nothing leaks.
+	ie_save_register_abandon(ie_save_register(strdup(path.c_str()), collect, &delivered));
+	iet::run_for(1.0);
+	EXPECT_EQ(delivered.size(), 1u);
+}
+
+/* Another user who can write to the folder, as fast as it can: every name
+ * it sees appear there is swapped for a symlink to the source or to a
+ * victim file, and after each published copy it plants a symlink to the
+ * victim at the next counter. Counts what it did in `attacks` (shared). */
+pid_t start_racer(const std::string &folder, const std::string &stem, const std::string &source,
+		  const std::string &victim, unsigned *attacks)
+{
+	pid_t pid = fork();
+	if (pid != 0)
+		return pid;
+	alarm(120);
+	if (chdir(folder.c_str()) != 0)
+		_exit(2);
+	// Root may enter any directory, a private one included; the attacker
+	// this guards against is another user, so a root test races as nobody.
+	if (geteuid() == 0) {
+		const passwd *nobody = getpwnam("nobody");
+		if (!nobody || setgroups(0, nullptr) != 0 || setgid(nobody->pw_gid) != 0 || setuid(nobody->pw_uid) != 0)
+			_exit(3);
+	}
+	const std::string source_name = fs::path(source).filename();
+	for (unsigned round = 0;; round++) {
+		DIR *listing = opendir(".");
+		if (!listing)
+			_exit(4);
+		while (dirent *entry = readdir(listing)) {
+			std::string name = entry->d_name;
+			if (name == "." || name == ".." || name == source_name || name.find("~moved") != std::string::npos)
+				continue;
+			int counter = 0;
+			char tail = 0;
+			if (sscanf(name.c_str() + std::min(name.size(), stem.size()), "_e%3d.jp%c", &counter, &tail) == 2 &&
+			    name.compare(0, stem.size(), stem) == 0) {
+				char next[64];
+				snprintf(next, sizeof(next), "_e%03d.jpg", counter + 1);
+				struct stat st;
+				if (lstat(name.c_str(), &st) == 0 && S_ISREG(st.st_mode) &&
+				    symlink(victim.c_str(), (stem + next).c_str()) == 0)
+					__atomic_add_fetch(attacks, 1, __ATOMIC_RELAXED);
+				continue;
+			}
+			std::string moved = name + "." + std::to_string(round) + "~moved";
+			if (rename(name.c_str(), moved.c_str()) == 0 &&
+			    symlink((round & 1 ? source : victim).c_str(), name.c_str()) == 0)
+				__atomic_add_fetch(attacks, 1, __ATOMIC_RELAXED);
+		}
+		closedir(listing);
+	}
+}
+
+/* Nothing the save creates may be reached by a name another process can
+ * swap: the racer never gets the saver to write through its links, with
+ * unnamed files or in a private directory. */
+TEST_F(SaveTest, ARacingProcessCannotRedirectTheWrite)
+{
+	std::string folder = dir + "/shared";
+	fs::create_directory(folder);
+	// On a tmpfs where one can be mounted: flushing to a disk only slows
+	// the race down.
+	mount_tmpfs(folder, "16m");
+	chmod(folder.c_str(), 0777);
+	std::string source = folder + "/a.png", victim = dir + "/victim";
+	ASSERT_TRUE(iet::write_picture(source, 24, 16));
+	write_bytes(victim, "precious");
+	std::string source_bytes = read_bytes(source);
+	auto *attacks = static_cast<unsigned *>(
+		mmap(nullptr, sizeof(unsigned), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0));
+	ASSERT_NE(attacks, MAP_FAILED);
+	allow_efl_error("Image save failed.");
+	Evas_Object *img = picture(32, 24);
+
+	for (Eina_Bool unnamed : {EINA_TRUE, EINA_FALSE}) {
+		SCOPED_TRACE(unnamed ? "unnamed files" : "private directory");
+		ie_save_unnamed_files_set(unnamed);
+		*attacks = 0;
+		pid_t racer = start_racer(folder, "a", source, victim, attacks);
+		ASSERT_GT(racer, 0);
+		std::vector<std::string> saved;
+		int failed = 0;
+		for (int i = 0; i < 200; i++) {
+			_save_init(source.c_str());
+			Eina_Bool memory_full = EINA_FALSE;
+			CString path(_save_to_file(img, &memory_full));
+			if (path)
+				saved.push_back(path.get());
+			else
+				failed++;
+		}
+		kill(racer, SIGKILL);
+		int status = 0;
+		waitpid(racer, &status, 0);
+		EXPECT_TRUE(WIFSIGNALED(status)) << "the racer stopped early: " << WEXITSTATUS(status);
+
+		// Unnamed files leave it only the published names to plant links by.
+		EXPECT_GT(*attacks, unnamed ? 0u : 50u) << "the racer hardly raced";
+		EXPECT_EQ(read_bytes(source), source_bytes);
+		EXPECT_EQ(read_bytes(victim), "precious");
+		EXPECT_GE(saved.size(), 150u) << failed << " saves failed";
+		for (const std::string &path : saved) {
+			struct stat st;
+			ASSERT_EQ(lstat(path.c_str(), &st), 0) << path;
+			EXPECT_TRUE(S_ISREG(st.st_mode)) << path << " is not the written file";
+			Evas_Object *check = evas_object_image_add(evas());
+			evas_object_image_file_set(check, path.c_str(), nullptr);
+			int w = 0, h = 0;
+			evas_object_image_size_get(check, &w, &h);
+			EXPECT_EQ(w * 1000 + h, 32 * 1000 + 24) << path;
+			evas_object_del(check);
+			unlink(path.c_str());
+		}
+	}
+	munmap(attacks, sizeof(unsigned));
+}
+
+/* A save killed on its way leaves nothing in the folder with unnamed
+ * files. In a private directory it leaves that directory, which the next
+ * save in the folder removes, but never one that a live save holds. */
+TEST_F(SaveTest, SavesKilledOnTheirWayLeaveNothingBehind)
+{
+	std::string source = dir + "/a.png";
+	ASSERT_TRUE(iet::write_picture(source, 16, 16));
+	Evas_Object *big = picture(1200, 900);
+	auto work_dirs = [this] {
+		std::set<std::string> found;
+		for (const std::string &name : entries(dir))
+			if (name.compare(0, strlen(IE_SAVE_WORK_DIR_PREFIX), IE_SAVE_WORK_DIR_PREFIX) == 0)
+				found.insert(name);
+		return found;
+	};
+	auto held_by_another = [this](const std::string &name) {
+		int fd = open((dir + "/" + name).c_str(), O_RDONLY | O_DIRECTORY);
+		bool held = fd >= 0 && flock(fd, LOCK_EX | LOCK_NB) != 0;
+		if (fd >= 0)
+			close(fd);
+		return held;
+	};
+	auto save_in_child = [&] {
+		pid_t pid = fork();
+		if (pid == 0) {
+			alarm(30);
+			_save_init(source.c_str());
+			Eina_Bool memory_full = EINA_FALSE;
+			_exit(_save_to_file(big, &memory_full) ? 0 : 1);
+		}
+		return pid;
+	};
+
+	// Kills saves at random points until `wanted` of them left something
+	// besides whole pictures, or `count` were killed; returns how many did.
+	// Each save clears what the one killed before it left.
+	std::mt19937 rng(7);
+	auto kill_saves = [&](int count, int wanted) {
+		int left_behind = 0;
+		for (int kill_count = 0; kill_count < count && left_behind < wanted; kill_count++) {
+			pid_t child = save_in_child();
+			EXPECT_GT(child, 0);
+			usleep(5000 + rng() % 50000);
+			kill(child, SIGKILL);
+			waitpid(child, nullptr, 0);
+			size_t found = 0;
+			for (const std::string &name : entries(dir))
+				found += name[0] == '.';
+			EXPECT_LE(found, 1u);
+			left_behind += found != 0;
+		}
+		return left_behind;
+	};
+	EXPECT_EQ(kill_saves(10, 1), 0) << "an unnamed file went with its process";
+
+	ie_save_unnamed_files_set(EINA_FALSE);
+	ASSERT_EQ(kill_saves(100, 3), 3) << "too few kills landed inside a save";
+
+	// Stop a live save while it holds its directory.
+	std::string held;
+	pid_t holder = -1;
+	for (int attempt = 0; attempt < 20 && held.empty(); attempt++) {
+		holder = save_in_child();
+		for (int poll = 0; poll < 5000 && held.empty(); poll++) {
+			for (const std::string &name : work_dirs())
+				if (held_by_another(name)) {
+					kill(holder, SIGSTOP);
+					if (held_by_another(name))
+						held = name;
+					else
+						kill(holder, SIGCONT);
+					break;
+				}
+			usleep(100);
+		}
+		if (held.empty())
+			waitpid(holder, nullptr, 0);
+	}
+	ASSERT_FALSE(held.empty()) << "no save was caught holding its directory";
+
+	_save_init(source.c_str());
+	EXPECT_NE(save(), "");
+	EXPECT_EQ(work_dirs(), std::set<std::string>{held});
+	kill(holder, SIGCONT);
+	int status = -1;
+	waitpid(holder, &status, 0);
+	EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << "the held save went on to succeed";
+	EXPECT_TRUE(work_dirs().empty());
+	// Only whole pictures were ever published.
+	for (const std::string &name : entries(dir)) {
+		if (name == "a.png")
+			continue;
+		std::string bytes = read_bytes(dir + "/" + name);
+		EXPECT_EQ(bytes.substr(bytes.size() - 2), "\xFF\xD9") << name;
+	}
+}
+
+/* Metadata comes only from a JPEG source; a damaged EXIF block is left
+ * out with a warning, and the colour profile still goes. */
+TEST_F(SaveTest, MetadataOnlyFromWhatTheSourceCarriesReadably)
+{
+	auto markers = [](const std::string &path) {
+		std::vector<int> found;
+		for (const iet::Segment &segment : iet::jpeg_segments(path))
+			if (segment.marker >= 0xE0 && segment.marker <= 0xEF)
+				found.push_back(segment.marker);
+		return found;
+	};
+	std::string png = dir + "/plain.png";
+	ASSERT_TRUE(iet::write_picture(png, 32, 24));
+	_save_init(png.c_str());
+	std::string from_png = save(32, 24);
+	EXPECT_EQ(markers(from_png), std::vector<int>{0xE0}) << "the encoder's JFIF header alone";
+
+	std::string damaged = dir + "/damaged.jpg";
+	ASSERT_TRUE(iet::write_photo(damaged, 32, 24, 6));
+	std::string bytes = read_bytes(damaged);
+	size_t tiff = bytes.find(std::string("Exif\0\0", 6)) + 6;
+	bytes.replace(tiff, 4, std::string("XX\x2A\x00", 4));
+	write_bytes(damaged, bytes);
+	_save_init(damaged.c_str());
+	iet::log_clear();
+	std::string from_damaged = save(32, 24);
+	ASSERT_FALSE(from_damaged.empty());
+	EXPECT_EQ(markers(from_damaged), (std::vector<int>{0xE0, 0xE2, 0xE2}));
+	EXPECT_TRUE(iet::jpeg_icc_profile(from_damaged) == iet::test_icc_profile());
+	EXPECT_EQ(iet::log_count("The EXIF block of " + damaged + " is damaged; saving without it", PLATFORM_LOG_WARN), 1);
 }
 
 } // namespace

@@ -73,6 +73,12 @@ struct _Viewhandle {
 	float effect_last_alpha;
 	int32_t effect_buf_row;
 	int32_t slider_drag_value;
+
+	/* Save (ie-menu.cpp): the registration of the saved file still running
+	 * after Done, and the processing popup shown when it takes a while. */
+	struct _Ie_Save_Registration *save_registration;
+	Ecore_Timer *save_popup_timer;
+	Evas_Object *save_popup;
 };
 
 /* editor-svc.cpp */
@@ -99,6 +105,9 @@ void _on_menu_done(void *data, Evas_Object *obj, void *event_info);
 void _popup_close(Viewhandle *vh);
 /* Done's crop: the picture replaced by its part under the selection box. */
 void __apply_crop(Viewhandle *vh);
+/* Forgets a save still registering, for IE_destroy: nothing of it runs on
+ * the freed record. */
+void _save_flow_release(Viewhandle *vh);
 
 /* ie-effect-view.cpp, ie-effect-thumbnail.cpp: the data of one effect-grid
  * item. */

@@ -255,6 +255,7 @@ void IE_destroy(Viewhandle *vh)
 	 * the window's focus manager, and closed after the view it hands the
 	 * focus back to a widget of that view already deleted. */
 	ie_idlers_cancel(vh);
+	_save_flow_release(vh);
 	_popup_close(vh);
 	int view = ie_view_mgr_get_current_view();
 	if (view == IE_VIEW_TYPE_EFFECT || view == IE_VIEW_TYPE_CROP)

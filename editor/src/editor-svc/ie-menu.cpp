@@ -1,5 +1,5 @@
-/* What Cancel, Done and the back key do in each view, and the editor's two
- * popups (discard changes; not enough memory). */
+/* What Cancel, Done and the back key do in each view, and the editor's
+ * popups (discard changes; not enough memory; could not save; saving). */
 #include <algorithm>
 #include <cstring>
 #include <memory>
@@ -14,6 +14,8 @@
 #include "ie-selectbox.h"
 
 #define IE_STORAGE_SETTINGS_APP_ID "setting-storage-efl"
+/* A registration quicker than this shows no processing popup. */
+#define IE_SAVE_POPUP_DELAY 0.3
 
 static void buttons_disabled_set(Viewhandle *vh, Eina_Bool disabled)
 {
@@ -122,6 +124,13 @@ static void show_memory_popup(Viewhandle *vh)
 	evas_object_show(popup);
 }
 
+static void show_save_failed_popup(Viewhandle *vh)
+{
+	Evas_Object *popup = popup_open(vh, "savefailedpopup", NULL, "IDS_IV_POP_UNABLE_TO_SAVE_PICTURE");
+	popup_button_add(vh, popup, "button1", "IDS_MEDIABR_BUTTON_OK", _popup_cancel_cb);
+	evas_object_show(popup);
+}
+
 static void back_to_main_view(Viewhandle *vh)
 {
 	ie_view_mgr_set_view(IE_VIEW_TYPE_MAIN, vh);
@@ -197,6 +206,9 @@ void _on_menu_cancel(void *data, Evas_Object *, void *)
 {
 	auto *vh = static_cast<Viewhandle *>(data);
 	IE_CHECK(data);
+	// The picture is saved: the editor closes with it once registered.
+	if (vh->save_registration)
+		return;
 
 	_popup_close(vh);
 	int view = ie_view_mgr_get_current_view();
@@ -220,16 +232,92 @@ void _on_menu_cancel(void *data, Evas_Object *, void *)
 	}
 }
 
+/* The back key waits for the registration. */
+static void _save_popup_back_cb(void *, Evas_Object *, void *)
+{
+}
+
+static void save_popup_close(Viewhandle *vh)
+{
+	if (vh->save_popup_timer) {
+		ecore_timer_del(vh->save_popup_timer);
+		vh->save_popup_timer = NULL;
+	}
+	if (vh->save_popup) {
+		evas_object_del(vh->save_popup);
+		vh->save_popup = NULL;
+	}
+}
+
+static Eina_Bool _save_popup_timer_cb(void *data)
+{
+	auto *vh = static_cast<Viewhandle *>(data);
+	vh->save_popup_timer = NULL;
+	Evas_Object *popup = elm_popup_add(vh->naviframe);
+	elm_object_style_set(popup, "image-editor");
+	elm_popup_align_set(popup, ELM_NOTIFY_ALIGN_FILL, 1.0);
+	evas_object_size_hint_weight_set(popup, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
+	ea_object_event_callback_add(popup, EA_CALLBACK_BACK, _save_popup_back_cb, vh);
+
+	Evas_Object *layout = elm_layout_add(popup);
+	if (!elm_layout_file_set(layout, IE_EDJ_FILE, "processing_view_layout"))
+		IE_LOG_E("Layout file set failed! %s in %s", "processing_view_layout", IE_EDJ_FILE);
+	evas_object_size_hint_weight_set(layout, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
+	elm_object_domain_translatable_part_text_set(layout, "elm.text", IE_TEXT_DOMAIN, "IDS_IV_TPOP_SAVING_ING");
+	Evas_Object *progressbar = elm_progressbar_add(layout);
+	elm_object_style_set(progressbar, "process_medium");
+	evas_object_size_hint_align_set(progressbar, EVAS_HINT_FILL, 0.5);
+	evas_object_size_hint_weight_set(progressbar, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
+	elm_progressbar_pulse_set(progressbar, EINA_TRUE);
+	elm_progressbar_pulse(progressbar, EINA_TRUE);
+	elm_object_part_content_set(layout, "processing", progressbar);
+	elm_object_part_content_set(popup, NULL, layout);
+	evas_object_show(popup);
+	vh->save_popup = popup;
+	return ECORE_CALLBACK_CANCEL;
+}
+
+static void _on_save_registered(void *data, char *path)
+{
+	auto *vh = static_cast<Viewhandle *>(data);
+	vh->save_registration = NULL;
+	save_popup_close(vh);
+	evas_object_smart_callback_call(vh->layout, "delete,me", path);
+}
+
+/* A failed save keeps the editor open with the edit, so the user can free
+ * some room or simply try again. */
 static void save_and_close(Viewhandle *vh)
 {
 	Eina_Bool memory_full = EINA_FALSE;
 	char *path = _save_to_file(ie_image_object_get(vh->main_image), &memory_full);
-	if (path)
+	if (!path) {
+		if (memory_full)
+			show_memory_popup(vh);
+		else
+			show_save_failed_popup(vh);
+		return;
+	}
+	// The database may be held by another process: the main loop goes on
+	// meanwhile, with the editor waiting for it and taking no more edits,
+	// which the saved file would not have.
+	vh->save_registration = ie_save_register(path, _on_save_registered, vh);
+	if (!vh->save_registration) {
 		evas_object_smart_callback_call(vh->layout, "delete,me", path);
-	else if (!memory_full)
-		evas_object_smart_callback_call(vh->layout, "delete,me", NULL);
-	else
-		show_memory_popup(vh);
+		return;
+	}
+	buttons_disabled_set(vh, EINA_TRUE);
+	if (vh->toolbar)
+		evas_object_pass_events_set(vh->toolbar, EINA_TRUE);
+	vh->save_popup_timer = ecore_timer_add(IE_SAVE_POPUP_DELAY, _save_popup_timer_cb, vh);
+}
+
+void _save_flow_release(Viewhandle *vh)
+{
+	IE_CHECK_AS(vh, "data");
+	ie_save_register_abandon(vh->save_registration);
+	vh->save_registration = NULL;
+	save_popup_close(vh);
 }
 
 void _on_menu_done(void *data, Evas_Object *, void *)
@@ -237,6 +325,8 @@ void _on_menu_done(void *data, Evas_Object *, void *)
 	auto *vh = static_cast<Viewhandle *>(data);
 	IE_CHECK(data);
 
+	if (vh->save_registration)
+		return;
 	switch (ie_view_mgr_get_current_view()) {
 	case IE_VIEW_TYPE_MAIN:
 	case IE_VIEW_TYPE_EFFECT:
