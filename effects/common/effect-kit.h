@@ -8,12 +8,57 @@
 #include <cmath>
 #include <cstddef>
 #include <cstdint>
+#include <cstdlib>
 #include <cstring>
 #include <memory>
 #include <new>
 #include <vector>
 
+#if defined(__x86_64__) || defined(__i386__)
+#define KIT_X86 1
+#include <immintrin.h>
+#else
+#define KIT_X86 0
+#endif
+
 namespace kit {
+
+/* Every pixel routine has a plain reference and, on processors with AVX2, a
+ * vector path that gives the same bytes; the tests hold one to the other. */
+enum class Path { REFERENCE, AVX2 };
+
+/* A path the tests pin so that both run in one process; nothing else
+ * sets it. */
+struct PathPin {
+	bool pinned = false;
+	Path path = Path::REFERENCE;
+};
+
+inline PathPin &path_pin()
+{
+	static PathPin pin;
+	return pin;
+}
+
+/* AVX2 where the processor has it, unless IEL_NO_SIMD=1 (the engine's
+ * switch: one variable turns every vector path off). */
+inline Path best_path()
+{
+	if (path_pin().pinned)
+		return path_pin().path;
+#if KIT_X86
+	static const Path path = [] {
+		const char *off = std::getenv("IEL_NO_SIMD");
+		if (off && std::strcmp(off, "1") == 0)
+			return Path::REFERENCE;
+		__builtin_cpu_init();
+		return __builtin_cpu_supports("avx2") ? Path::AVX2 : Path::REFERENCE;
+	}();
+	return path;
+#else
+	return Path::REFERENCE;
+#endif
+}
 
 enum Result {
 	RESULT_OK = 0,
