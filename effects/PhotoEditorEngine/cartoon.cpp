@@ -7,7 +7,9 @@ namespace pee {
  * a few flat bands (colours keep their hue), and ink is laid where a
  * difference of Gaussians finds the dark side of an edge. `outline` sets
  * the width of the ink. */
-int cartoon(const uint8_t *in, uint8_t *out, int width, int height, Weight outline)
+namespace {
+
+inline int cartoon_body(const uint8_t *in, uint8_t *out, int width, int height, Weight outline)
 {
 	return kit::guarded([&] {
 		const float extent = float(std::max(width, height));
@@ -45,6 +47,29 @@ int cartoon(const uint8_t *in, uint8_t *out, int width, int height, Weight outli
 		write_rgb888(flat, out);
 		return int(kit::RESULT_OK);
 	});
+}
+
+int cartoon_reference(const uint8_t *in, uint8_t *out, int width, int height, Weight outline)
+{
+	return cartoon_body(in, out, width, height, outline);
+}
+
+#if KIT_X86
+__attribute__((target("avx2"), flatten)) int cartoon_avx2(const uint8_t *in, uint8_t *out, int width, int height, Weight outline)
+{
+	return cartoon_body(in, out, width, height, outline);
+}
+#endif
+
+} // namespace
+
+int cartoon(const uint8_t *in, uint8_t *out, int width, int height, Weight outline)
+{
+#if KIT_X86
+	if (kit::best_path() == kit::Path::AVX2)
+		return cartoon_avx2(in, out, width, height, outline);
+#endif
+	return cartoon_reference(in, out, width, height, outline);
 }
 
 } // namespace pee

@@ -45,7 +45,9 @@ kit::Plane bristle_streaks(const kit::Plane &flow, float step)
  * picture into dabs of flat colour; bristle streaks follow the strokes,
  * and the streaks and the dabs' borders are lit from the top left as if
  * the paint stood up from the canvas. */
-int oil_paint(const uint8_t *in, uint8_t *out, int width, int height)
+namespace {
+
+inline int oil_paint_body(const uint8_t *in, uint8_t *out, int width, int height)
 {
 	return kit::guarded([&] {
 		const float extent = float(std::max(width, height));
@@ -86,6 +88,29 @@ int oil_paint(const uint8_t *in, uint8_t *out, int width, int height)
 		write_rgb888(paint, out);
 		return int(kit::RESULT_OK);
 	});
+}
+
+int oil_paint_reference(const uint8_t *in, uint8_t *out, int width, int height)
+{
+	return oil_paint_body(in, out, width, height);
+}
+
+#if KIT_X86
+__attribute__((target("avx2"), flatten)) int oil_paint_avx2(const uint8_t *in, uint8_t *out, int width, int height)
+{
+	return oil_paint_body(in, out, width, height);
+}
+#endif
+
+} // namespace
+
+int oil_paint(const uint8_t *in, uint8_t *out, int width, int height)
+{
+#if KIT_X86
+	if (kit::best_path() == kit::Path::AVX2)
+		return oil_paint_avx2(in, out, width, height);
+#endif
+	return oil_paint_reference(in, out, width, height);
 }
 
 } // namespace pee

@@ -8,7 +8,9 @@ namespace pee {
  * a region, the lighter the strokes that show, so highlights stay clean
  * paper and shadows fill with cross-hatching. `pencil` sets how hard the
  * lines are pressed. */
-int sketch(const uint8_t *in, const uint8_t *texture, uint8_t *out, int width, int height, Weight pencil)
+namespace {
+
+inline int sketch_body(const uint8_t *in, const uint8_t *texture, uint8_t *out, int width, int height, Weight pencil)
 {
 	return kit::guarded([&] {
 		const float extent = float(std::max(width, height));
@@ -46,6 +48,29 @@ int sketch(const uint8_t *in, const uint8_t *texture, uint8_t *out, int width, i
 		write_rgb888(drawing, out);
 		return int(kit::RESULT_OK);
 	});
+}
+
+int sketch_reference(const uint8_t *in, const uint8_t *texture, uint8_t *out, int width, int height, Weight pencil)
+{
+	return sketch_body(in, texture, out, width, height, pencil);
+}
+
+#if KIT_X86
+__attribute__((target("avx2"), flatten)) int sketch_avx2(const uint8_t *in, const uint8_t *texture, uint8_t *out, int width, int height, Weight pencil)
+{
+	return sketch_body(in, texture, out, width, height, pencil);
+}
+#endif
+
+} // namespace
+
+int sketch(const uint8_t *in, const uint8_t *texture, uint8_t *out, int width, int height, Weight pencil)
+{
+#if KIT_X86
+	if (kit::best_path() == kit::Path::AVX2)
+		return sketch_avx2(in, texture, out, width, height, pencil);
+#endif
+	return sketch_reference(in, texture, out, width, height, pencil);
 }
 
 } // namespace pee

@@ -37,16 +37,10 @@ void shrunk_highlights(const unsigned char *in, int width, int height, int facto
 
 } // namespace
 
-/* Soft glow: a diffusion filter. The picture is softened and its
- * highlights, blurred wide, are screened back over it so that light areas
- * bloom. `level` 0..100 is the strength (100, what the editor passes, is
- * the full effect; 0 keeps the picture); other levels are refused. The blur
- * widths follow the picture's size, so a thumbnail looks like the full
- * picture. */
-int applySoftglow(const unsigned char *in, unsigned char *out, int width, int height, int level)
+namespace {
+
+inline int soft_glow_body(const unsigned char *in, unsigned char *out, int width, int height, int level)
 {
-	if (!pee::bgra_arguments_usable(in, out, width, height) || level < 0 || level > 100)
-		return kit::RESULT_BAD_ARGUMENT;
 	return kit::guarded([&] {
 		const float strength = float(level) / 100.f;
 		const float extent = float(std::max(width, height));
@@ -85,4 +79,35 @@ int applySoftglow(const unsigned char *in, unsigned char *out, int width, int he
 		kit::write_rgb(picture, out, 4, 2, 1, 0);
 		return int(kit::RESULT_OK);
 	});
+}
+
+int soft_glow_reference(const unsigned char *in, unsigned char *out, int width, int height, int level)
+{
+	return soft_glow_body(in, out, width, height, level);
+}
+
+#if KIT_X86
+__attribute__((target("avx2"), flatten)) int soft_glow_avx2(const unsigned char *in, unsigned char *out, int width, int height, int level)
+{
+	return soft_glow_body(in, out, width, height, level);
+}
+#endif
+
+} // namespace
+
+/* Soft glow: a diffusion filter. The picture is softened and its
+ * highlights, blurred wide, are screened back over it so that light areas
+ * bloom. `level` 0..100 is the strength (100, what the editor passes, is
+ * the full effect; 0 keeps the picture); other levels are refused. The blur
+ * widths follow the picture's size, so a thumbnail looks like the full
+ * picture. */
+int applySoftglow(const unsigned char *in, unsigned char *out, int width, int height, int level)
+{
+	if (!pee::bgra_arguments_usable(in, out, width, height) || level < 0 || level > 100)
+		return kit::RESULT_BAD_ARGUMENT;
+#if KIT_X86
+	if (kit::best_path() == kit::Path::AVX2)
+		return soft_glow_avx2(in, out, width, height, level);
+#endif
+	return soft_glow_reference(in, out, width, height, level);
 }
