@@ -1,4 +1,5 @@
 #include "engine-effects.h"
+#include "kuwahara.h"
 
 namespace pee {
 namespace {
@@ -53,39 +54,55 @@ inline int oil_paint_body(const uint8_t *in, uint8_t *out, int width, int height
 		const float extent = float(std::max(width, height));
 		kit::Rgb paint = kuwahara(in, width, height, std::max(2, int(extent / 160.f)));
 
-		kit::Plane relief = kit::luma_plane(paint);
+		kit::Plane relief(width, height);
+		for (size_t i = 0; i < relief.v.size(); ++i)
+			relief.v[i] = 0.299f * paint.r.v[i] + 0.587f * paint.g.v[i] + 0.114f * paint.b.v[i];
 		/* Streaks are drawn on a half-size grid on large pictures: they
 		 * are several pixels long there anyway. */
 		const int grid = extent >= 640.f ? 2 : 1;
 		kit::Plane flow = grid > 1 ? kit::shrink(relief, grid) : relief;
 		kit::gaussian_blur(flow, std::max(1.f, extent / 300.f / float(grid)));
-		kit::Plane streaks = bristle_streaks(flow, std::max(1.f, extent / 420.f / float(grid)));
-		if (grid > 1) {
-			kit::Plane full(width, height);
-			kit::expand_into(streaks, grid, full);
-			streaks = std::move(full);
-		}
-		kit::gaussian_blur(relief, std::max(0.6f, extent / 1600.f));
+		const kit::Plane streaks = bristle_streaks(flow, std::max(1.f, extent / 420.f / float(grid)));
+		kit::Expander streak_rows(streaks, grid, width, height);
+		kit::BlurredRows relief_rows(width, height, std::max(0.6f, extent / 1600.f),
+					     [&](int y) { return relief.row(y); });
 
 		/* Bristle marks are finer than a pixel of a thumbnail: there they
 		 * would only add noise, so they fade with the picture's size. */
 		const float bristle_depth = 0.9f * std::clamp(extent / 1280.f, 0.3f, 1.f);
+		/* The rows above and below each output row, of the blurred relief
+		 * and the enlarged streaks, in rings of three. */
+		kit::Floats rings(size_t(width) * 6);
+		auto relief_at = [&](int y) { return &rings[size_t(y % 3) * size_t(width)]; };
+		auto streaks_at = [&](int y) { return &rings[size_t(3 + y % 3) * size_t(width)]; };
+		int made = -1;
 		for (int y = 0; y < height; ++y) {
-			const size_t above = size_t(std::max(y - 1, 0)) * size_t(width);
-			const size_t below = size_t(std::min(y + 1, height - 1)) * size_t(width);
-			const size_t row = size_t(y) * size_t(width);
-			for (int x = 0; x < width; ++x) {
-				const size_t left = size_t(std::max(x - 1, 0)), right = size_t(std::min(x + 1, width - 1));
-				float edge_light = relief.v[above + left] - relief.v[below + right];
-				float bristle = streaks.v[above + left] - streaks.v[below + right];
-				float shade = edge_light * 0.8f + bristle * bristle_depth * float(grid);
-				size_t i = row + size_t(x);
-				paint.r.v[i] += shade;
-				paint.g.v[i] += shade;
-				paint.b.v[i] += shade;
+			const int above = std::max(y - 1, 0), below = std::min(y + 1, height - 1);
+			while (made < below) {
+				++made;
+				relief_rows.row(made, relief_at(made));
+				streak_rows.row(made, streaks_at(made));
 			}
+			const float *relief_above = relief_at(above), *relief_below = relief_at(below);
+			const float *streaks_above = streaks_at(above), *streaks_below = streaks_at(below);
+			const float *r = paint.r.row(y), *g = paint.g.row(y), *b = paint.b.row(y);
+			uint8_t *o = out + size_t(y) * size_t(width) * 3;
+			auto shade_at = [&](int x, int left, int right) {
+				float edge_light = relief_above[left] - relief_below[right];
+				float bristle = streaks_above[left] - streaks_below[right];
+				float shade = edge_light * 0.8f + bristle * bristle_depth * float(grid);
+				o[size_t(x) * 3] = kit::clamp_byte(r[x] + shade);
+				o[size_t(x) * 3 + 1] = kit::clamp_byte(g[x] + shade);
+				o[size_t(x) * 3 + 2] = kit::clamp_byte(b[x] + shade);
+			};
+			/* The edge columns apart, so that the inner ones read in
+			 * order. */
+			shade_at(0, 0, std::min(1, width - 1));
+			for (int x = 1; x < width - 1; ++x)
+				shade_at(x, x - 1, x + 1);
+			if (width > 1)
+				shade_at(width - 1, width - 2, width - 1);
 		}
-		write_rgb888(paint, out);
 		return int(kit::RESULT_OK);
 	});
 }
