@@ -30,8 +30,9 @@ void shrunk_highlights(const unsigned char *in, int width, int height, int facto
 			}
 			/* Added block by block in the order of the pixels. */
 			for (int c = 0; c < 3; ++c)
-				for (int x = 0; x < width; ++x)
-					row[c][size_t(x / factor)] += weighted[c][size_t(x)];
+				for (int sx = 0, x = 0; sx < sw; ++sx)
+					for (const int end = std::min(x + factor, width); x < end; ++x)
+						row[c][size_t(sx)] += weighted[c][size_t(x)];
 		}
 		for (int sx = 0; sx < sw; ++sx) {
 			const float count = float(std::min(factor, width - sx * factor) * (y1 - y0));
