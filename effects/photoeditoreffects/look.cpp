@@ -248,11 +248,27 @@ void run_avx2(const Kernel &k, const unsigned char *in, unsigned char *out,
 	const __m256i green_curve = _mm256_set1_epi32(CURVE_SPAN), blue_curve = _mm256_set1_epi32(2 * CURVE_SPAN);
 	const int *table = reinterpret_cast<const int *>(&kernel.curves->map[0][0][0]);
 	Wear wear{kernel.scratches, kit::Path::AVX2, {}, UINT32_MAX};
+	/* A row's radial levels before dithering depend only on the row's part
+	 * of the distance, which neighbouring rows often share: looked up once
+	 * for each run of rows that shares it. */
+	std::vector<int32_t> level_row((FEATURES & RADIAL) ? size_t(width) + 8 : 0);
+	int32_t levels_for = -1;
 	for (int y = 0; y < height; ++y) {
 		size_t row = size_t(y) * size_t(width) * 4;
 		const unsigned char *src = in + row;
 		unsigned char *dst = out + row;
-		const __m256i radial_y = _mm256_set1_epi32((FEATURES & RADIAL) ? kernel.radial_row[y] : 0);
+		if ((FEATURES & RADIAL) && kernel.radial_row[y] != levels_for) {
+			levels_for = kernel.radial_row[y];
+			const __m256i radial_y = _mm256_set1_epi32(levels_for);
+			int x = 0;
+			for (; x + 8 <= width; x += 8) {
+				const __m256i d = _mm256_min_epi32(cap, _mm256_add_epi32(radial_y, load(kernel.radial_column + x)));
+				_mm256_storeu_si256(reinterpret_cast<__m256i *>(&level_row[size_t(x)]),
+						    _mm256_i32gather_epi32(kernel.level_of, d, 4));
+			}
+			for (; x < width; ++x)
+				level_row[size_t(x)] = kernel.level_of[std::min(kit::RADIAL_CAP, levels_for + kernel.radial_column[x])];
+		}
 		const int32_t start = (FEATURES & (GRAIN | RADIAL)) ? kernel.strip_start[y] : 0;
 		const int32_t *noise = (FEATURES & GRAIN) ? kernel.grain + start : nullptr;
 		const int32_t *dither = (FEATURES & RADIAL) ? kernel.dither + start : nullptr;
@@ -281,9 +297,7 @@ void run_avx2(const Kernel &k, const unsigned char *in, unsigned char *out,
 			}
 			__m256i base = (FEATURES & GRAIN) ? _mm256_add_epi32(load(noise + x), pad) : pad;
 			if (FEATURES & RADIAL) {
-				const __m256i d = _mm256_min_epi32(cap, _mm256_add_epi32(radial_y, load(kernel.radial_column + x)));
-				const __m256i level = _mm256_srli_epi32(
-					_mm256_add_epi32(_mm256_i32gather_epi32(kernel.level_of, d, 4), load(dither + x)), 4);
+				const __m256i level = _mm256_srli_epi32(_mm256_add_epi32(load(&level_row[size_t(x)]), load(dither + x)), 4);
 				base = _mm256_add_epi32(base, _mm256_mullo_epi32(level, level_span));
 			}
 			auto lookup = [&](__m256i index) {
