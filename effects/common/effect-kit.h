@@ -495,8 +495,9 @@ private:
 	{
 		const float *src = source_(j);
 		const int r = radius_;
-		for (int i = 0; i < width_ + 2 * r; ++i)
-			line_[size_t(i)] = src[std::clamp(i - r, 0, width_ - 1)];
+		std::fill(line_.begin(), line_.begin() + r, src[0]);
+		std::copy(src, src + width_, line_.begin() + r);
+		std::fill(line_.begin() + r + width_, line_.end(), src[width_ - 1]);
 		float *dst = &ring_[size_t(j % (2 * r + 1)) * size_t(width_)];
 		std::fill(dst, dst + width_, 0.f);
 		for (int k = 0; k <= 2 * r; ++k) {
