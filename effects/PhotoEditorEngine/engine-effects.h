@@ -19,12 +19,6 @@ int oil_paint(const uint8_t *in, uint8_t *out, int width, int height);
 /* `texture` holds width x height BGRA pixels of paper with hatching. */
 int sketch(const uint8_t *in, const uint8_t *texture, uint8_t *out, int width, int height, Weight pencil);
 
-/* Kuwahara filter of RGB888 pixels: each pixel takes the mean colour of
- * the least varied of the four (radius + 1)-square quadrants around it.
- * Flattens regions while keeping their borders sharp. The radius is kept
- * within 1..40. */
-kit::Rgb kuwahara(const uint8_t *rgb, int width, int height, int radius);
-
 inline kit::Plane luma_rgb888(const uint8_t *px, int width, int height)
 {
 	kit::Plane y(width, height);

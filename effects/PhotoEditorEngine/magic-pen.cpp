@@ -6,43 +6,78 @@ namespace pee {
  * The edges of the (lightly smoothed) picture become lines in the
  * picture's own colours, richer and at full brightness, with a wide halo
  * of the same colour around them. */
-int magic_pen(const uint8_t *in, uint8_t *out, int width, int height)
+namespace {
+
+inline int magic_pen_body(const uint8_t *in, uint8_t *out, int width, int height)
 {
 	return kit::guarded([&] {
 		const float extent = float(std::max(width, height));
-		kit::Rgb picture = read_rgb888(in, width, height);
-		kit::Plane lines = kit::luma_plane(picture);
-		kit::gaussian_blur(lines, std::max(0.7f, extent / 900.f));
-		lines = kit::sobel_magnitude(lines);
+		kit::Plane luma = luma_rgb888(in, width, height);
+		kit::Plane smoothed(width, height);
+		kit::gaussian_blur(luma, smoothed, std::max(0.7f, extent / 900.f));
+		kit::Plane &lines = luma;
+		kit::sobel_magnitude(smoothed, lines);
 		for (float &v : lines.v)
 			v = kit::smoothstep(12.f, 90.f, v);
-		kit::Plane halo = lines;
-		kit::gaussian_blur(halo, extent / 160.f);
+		kit::BlurredRows halo(width, height, extent / 160.f, [&](int y) { return lines.row(y); });
 
 		/* The stroke colour: the picture's colour smoothed, so that a line
 		 * keeps one hue along its length. */
-		kit::Plane *channels[3] = {&picture.r, &picture.g, &picture.b};
-		for (kit::Plane *c : channels)
-			kit::gaussian_blur(*c, extent / 300.f);
-		for (size_t i = 0; i < lines.v.size(); ++i) {
-			float r = picture.r.v[i], g = picture.g.v[i], b = picture.b.v[i];
-			float l = 0.299f * r + 0.587f * g + 0.114f * b;
-			/* Richer, at full brightness, nudged towards white so that
-			 * grey edges still shine. */
-			r = std::max(0.f, l + (r - l) * 2.2f);
-			g = std::max(0.f, l + (g - l) * 2.2f);
-			b = std::max(0.f, l + (b - l) * 2.2f);
-			float scale = 0.85f * 255.f / std::max({r, g, b, 1.f});
-			float light = lines.v[i] + halo.v[i] * 1.6f;
-			/* A faint trace of the picture stays as the dark ground. */
-			float ground = l * 0.08f;
-			picture.r.v[i] = ground + (r * scale + 38.f) * light;
-			picture.g.v[i] = ground + (g * scale + 38.f) * light;
-			picture.b.v[i] = ground + (b * scale + 38.f) * light;
+		kit::BlurredRows colour[3] = {
+			{width, height, extent / 300.f, kit::ChannelRows(in, width, 3, 0)},
+			{width, height, extent / 300.f, kit::ChannelRows(in, width, 3, 1)},
+			{width, height, extent / 300.f, kit::ChannelRows(in, width, 3, 2)}};
+		kit::Floats rows(size_t(width) * 4);
+		float *halo_row = rows.data(), *red = halo_row + width, *green = red + width, *blue = green + width;
+		for (int y = 0; y < height; ++y) {
+			halo.row(y, halo_row);
+			colour[0].row(y, red);
+			colour[1].row(y, green);
+			colour[2].row(y, blue);
+			const float *line = lines.row(y);
+			uint8_t *o = out + size_t(y) * size_t(width) * 3;
+			for (int x = 0; x < width; ++x, o += 3) {
+				float r = red[x], g = green[x], b = blue[x];
+				float l = 0.299f * r + 0.587f * g + 0.114f * b;
+				/* Richer, at full brightness, nudged towards white so
+				 * that grey edges still shine. */
+				r = std::max(0.f, l + (r - l) * 2.2f);
+				g = std::max(0.f, l + (g - l) * 2.2f);
+				b = std::max(0.f, l + (b - l) * 2.2f);
+				float scale = 0.85f * 255.f / std::max(std::max(std::max(r, g), b), 1.f);
+				float light = line[x] + halo_row[x] * 1.6f;
+				/* A faint trace of the picture stays as the dark ground. */
+				float ground = l * 0.08f;
+				o[0] = kit::clamp_byte(ground + (r * scale + 38.f) * light);
+				o[1] = kit::clamp_byte(ground + (g * scale + 38.f) * light);
+				o[2] = kit::clamp_byte(ground + (b * scale + 38.f) * light);
+			}
 		}
-		write_rgb888(picture, out);
 		return int(kit::RESULT_OK);
 	});
+}
+
+int magic_pen_reference(const uint8_t *in, uint8_t *out, int width, int height)
+{
+	return magic_pen_body(in, out, width, height);
+}
+
+#if KIT_X86
+__attribute__((target("avx2"), flatten)) int magic_pen_avx2(const uint8_t *in, uint8_t *out, int width, int height)
+{
+	return magic_pen_body(in, out, width, height);
+}
+#endif
+
+} // namespace
+
+int magic_pen(const uint8_t *in, uint8_t *out, int width, int height)
+{
+#if KIT_X86
+	if (kit::best_path() == kit::Path::AVX2)
+		return magic_pen_avx2(in, out, width, height);
+#endif
+	return magic_pen_reference(in, out, width, height);
 }
 
 } // namespace pee

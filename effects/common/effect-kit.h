@@ -8,12 +8,58 @@
 #include <cmath>
 #include <cstddef>
 #include <cstdint>
+#include <cstdlib>
 #include <cstring>
+#include <functional>
 #include <memory>
 #include <new>
 #include <vector>
 
+#if defined(__x86_64__) || defined(__i386__)
+#define KIT_X86 1
+#include <immintrin.h>
+#else
+#define KIT_X86 0
+#endif
+
 namespace kit {
+
+/* Every pixel routine has a plain reference and, on processors with AVX2, a
+ * vector path that gives the same bytes; the tests hold one to the other. */
+enum class Path { REFERENCE, AVX2 };
+
+/* A path the tests pin so that both run in one process; nothing else
+ * sets it. */
+struct PathPin {
+	bool pinned = false;
+	Path path = Path::REFERENCE;
+};
+
+inline PathPin &path_pin()
+{
+	static PathPin pin;
+	return pin;
+}
+
+/* AVX2 where the processor has it, unless IEL_NO_SIMD=1 (the engine's
+ * switch: one variable turns every vector path off). */
+inline Path best_path()
+{
+	if (path_pin().pinned)
+		return path_pin().path;
+#if KIT_X86
+	static const Path path = [] {
+		const char *off = std::getenv("IEL_NO_SIMD");
+		if (off && std::strcmp(off, "1") == 0)
+			return Path::REFERENCE;
+		__builtin_cpu_init();
+		return __builtin_cpu_supports("avx2") ? Path::AVX2 : Path::REFERENCE;
+	}();
+	return path;
+#else
+	return Path::REFERENCE;
+#endif
+}
 
 enum Result {
 	RESULT_OK = 0,
@@ -117,14 +163,37 @@ struct Radial {
 	}
 };
 
+/* Leaves new elements uninitialised: a plane is written before it is read,
+ * and zero-filling megabytes first costs as much as the pass that fills
+ * them. */
+template <class T>
+struct UninitialisedAllocator : std::allocator<T> {
+	template <class U>
+	struct rebind {
+		using other = UninitialisedAllocator<U>;
+	};
+	UninitialisedAllocator() = default;
+	template <class U>
+	UninitialisedAllocator(const UninitialisedAllocator<U> &) noexcept {}
+	template <class U>
+	void construct(U *p) noexcept { ::new (static_cast<void *>(p)) U; }
+	template <class U, class... A>
+	void construct(U *p, A &&...a) { ::new (static_cast<void *>(p)) U(std::forward<A>(a)...); }
+};
+
+using Floats = std::vector<float, UninitialisedAllocator<float>>;
+
 /* One channel of a picture as floats, rows back to back. */
 struct Plane {
 	int width = 0;
 	int height = 0;
-	std::vector<float> v;
+	Floats v;
 
 	Plane() = default;
-	Plane(int w, int h, float fill = 0.f) : width(w), height(h), v(size_t(w) * size_t(h), fill) {}
+	Plane(int w, int h) : width(w), height(h), v(size_t(w) * size_t(h)) {}
+	Plane(int w, int h, float fill) : width(w), height(h), v(size_t(w) * size_t(h), fill) {}
+	float *row(int y) { return v.data() + size_t(y) * size_t(width); }
+	const float *row(int y) const { return v.data() + size_t(y) * size_t(width); }
 };
 
 /* A picture as three float planes (red, green, blue). */
@@ -171,6 +240,26 @@ inline void write_rgb(const Rgb &rgb, uint8_t *px, int step, int ri, int gi, int
 			px[3] = 255;
 	}
 }
+
+/* One byte of packed pixels (`step` bytes each) as a row of floats at a
+ * time: a source of rows for the blurs that needs no plane. */
+struct ChannelRows {
+	const uint8_t *px;
+	int width, step, channel;
+	Floats row;
+
+	ChannelRows(const uint8_t *pixels, int w, int bytes_per_pixel, int c)
+		: px(pixels), width(w), step(bytes_per_pixel), channel(c), row(size_t(w))
+	{
+	}
+	const float *operator()(int y)
+	{
+		const uint8_t *src = px + size_t(y) * size_t(width) * size_t(step) + size_t(channel);
+		for (int x = 0; x < width; ++x)
+			row[size_t(x)] = float(src[size_t(x) * size_t(step)]);
+		return row.data();
+	}
+};
 
 /* Box mean of radius r over every row, the border repeated; a running sum
  * makes it O(1) per sample whatever the radius. */
@@ -221,10 +310,10 @@ inline void box_blur_columns(const Plane &src, Plane &dst, int radius)
 	}
 }
 
-/* Direct separable convolution with a sampled Gaussian: exact for the
- * small widths where box passes, whose radius is a whole number, cannot
- * tell sigma 0.8 from sigma 1.2. */
-inline void gaussian_blur_kernel(Plane &p, float sigma)
+/* The sampled Gaussian of a direct convolution: exact for the small widths
+ * where box passes, whose radius is a whole number, cannot tell sigma 0.8
+ * from sigma 1.2. */
+inline std::vector<float> gaussian_taps(float sigma)
 {
 	const int radius = std::max(1, int(std::ceil(3.f * sigma)));
 	std::vector<float> kernel(size_t(2 * radius + 1));
@@ -233,37 +322,227 @@ inline void gaussian_blur_kernel(Plane &p, float sigma)
 		total += kernel[size_t(i + radius)] = std::exp(-float(i * i) / (2.f * sigma * sigma));
 	for (float &k : kernel)
 		k /= total;
-	const int w = p.width, h = p.height;
-	Plane tmp(w, h);
-	std::vector<float> line(size_t(w + 2 * radius));
-	for (int y = 0; y < h; ++y) {
-		const float *src = &p.v[size_t(y) * size_t(w)];
-		for (int i = 0; i < w + 2 * radius; ++i)
-			line[size_t(i)] = src[std::clamp(i - radius, 0, w - 1)];
-		/* Tap by tap over the whole row, so the loop vectorises. */
-		float *dst = &tmp.v[size_t(y) * size_t(w)];
-		std::fill(dst, dst + w, 0.f);
-		for (int k = 0; k <= 2 * radius; ++k) {
-			const float *shifted = &line[size_t(k)];
-			const float weight = kernel[size_t(k)];
-			for (int x = 0; x < w; ++x)
+	return kernel;
+}
+
+/* Mean of each factor x factor block (the last ones partial) of a picture
+ * whose rows `rows(y)` hands out in order. */
+template <class Rows>
+Plane shrink_rows(int width, int height, int factor, Rows &&rows)
+{
+	Plane small((width + factor - 1) / factor, (height + factor - 1) / factor);
+	std::vector<float> row_sum(size_t(small.width));
+	for (int sy = 0; sy < small.height; ++sy) {
+		std::fill(row_sum.begin(), row_sum.end(), 0.f);
+		const int y0 = sy * factor, y1 = std::min(y0 + factor, height);
+		for (int y = y0; y < y1; ++y) {
+			const float *src = rows(y);
+			if (factor == 2) {
+				/* The common case, without the inner loop's overhead. */
+				const int pairs = width / 2;
+				for (int sx = 0; sx < pairs; ++sx)
+					row_sum[size_t(sx)] += src[2 * sx] + src[2 * sx + 1];
+				if (width % 2)
+					row_sum[size_t(pairs)] += src[width - 1];
+				continue;
+			}
+			for (int sx = 0; sx < small.width; ++sx) {
+				const int x0 = sx * factor, x1 = std::min(x0 + factor, width);
+				float sum = 0.f;
+				for (int x = x0; x < x1; ++x)
+					sum += src[x];
+				row_sum[size_t(sx)] += sum;
+			}
+		}
+		float *dst = small.row(sy);
+		for (int sx = 0; sx < small.width; ++sx) {
+			const int columns = std::min(factor, width - sx * factor);
+			dst[sx] = row_sum[size_t(sx)] / float(columns * (y1 - y0));
+		}
+	}
+	return small;
+}
+
+inline Plane shrink(const Plane &p, int factor)
+{
+	return shrink_rows(p.width, p.height, factor, [&](int y) { return p.row(y); });
+}
+
+/* Bilinear enlargement of a shrunk plane, a row at a time: each output row
+ * mixes two rows of the small plane interpolated across, which are worked
+ * out once and kept while the output rows between them are made. */
+class Expander {
+public:
+	Expander(const Plane &small, int factor, int width, int height)
+		: small_(small), height_(height), inverse_(1.f / float(factor)), x0_(size_t(width)), x1_(size_t(width)),
+		  fx_(size_t(width)), across_{Floats(size_t(width)), Floats(size_t(width))}
+	{
+		for (int x = 0; x < width; ++x) {
+			float sx = std::clamp((float(x) + 0.5f) * inverse_ - 0.5f, 0.f, float(small.width - 1));
+			x0_[size_t(x)] = int(sx);
+			x1_[size_t(x)] = std::min(int(sx) + 1, small.width - 1);
+			fx_[size_t(x)] = sx - float(int(sx));
+		}
+	}
+
+	void row(int y, float *dst)
+	{
+		float sy = std::clamp((float(y) + 0.5f) * inverse_ - 0.5f, 0.f, float(small_.height - 1));
+		int y0 = int(sy), y1 = std::min(y0 + 1, small_.height - 1);
+		float fy = sy - float(y0);
+		const float *t = across(y0, y1), *u = across(y1, y0);
+		const size_t width = fx_.size();
+		for (size_t x = 0; x < width; ++x)
+			dst[x] = t[x] + (u[x] - t[x]) * fy;
+	}
+
+	int height() const { return height_; }
+
+private:
+	/* Small row `wanted` interpolated across, keeping `other` if held. */
+	const float *across(int wanted, int other)
+	{
+		for (int i = 0; i < 2; ++i)
+			if (held_[i] == wanted)
+				return across_[i].data();
+		const int slot = held_[0] == other ? 1 : 0;
+		held_[slot] = wanted;
+		const float *src = small_.row(wanted);
+		float *dst = across_[slot].data();
+		const size_t width = fx_.size();
+		for (size_t x = 0; x < width; ++x) {
+			const float a = src[x0_[x]], b = src[x1_[x]];
+			dst[x] = a + (b - a) * fx_[x];
+		}
+		return dst;
+	}
+
+	const Plane &small_;
+	int height_;
+	float inverse_;
+	std::vector<int> x0_, x1_;
+	std::vector<float> fx_;
+	Floats across_[2];
+	int held_[2] = {-1, -1};
+};
+
+/* Bilinear enlargement of a shrunk plane back over `p`. */
+inline void expand_into(const Plane &small, int factor, Plane &p)
+{
+	Expander expander(small, factor, p.width, p.height);
+	for (int y = 0; y < p.height; ++y)
+		expander.row(y, p.row(y));
+}
+
+/* Gaussian blur at full resolution, in place: the exact kernel when narrow,
+ * three box passes (each of variance r(r+1)/3) when wide. */
+inline void gaussian_blur_full(Plane &p, float sigma);
+
+/* A Gaussian blur of a picture whose rows `rows(y)` hands out, given out a
+ * row at a time, in order. A narrow blur convolves rows as they are needed,
+ * keeping the 2r + 1 rows blurred across in a ring; a wide one is worked
+ * out on a shrunk copy (where it costs a fraction and looks the same) and
+ * enlarged row by row. Nothing of the picture's size is kept but what a
+ * blur between those two needs. */
+class BlurredRows {
+public:
+	template <class Rows>
+	BlurredRows(int width, int height, float sigma, Rows &&rows) : width_(width), height_(height)
+	{
+		const int factor = std::min({int(sigma / 1.6f), width, height});
+		if (factor >= 2) {
+			small_ = shrink_rows(width, height, factor, rows);
+			gaussian_blur_full(small_, std::sqrt(std::max(0.f, sigma * sigma - float(factor * factor) / 4.f)) /
+							   float(factor));
+			expander_ = std::make_unique<Expander>(small_, factor, width, height);
+			return;
+		}
+		if (sigma > 0.f && sigma < 2.5f) {
+			taps_ = gaussian_taps(sigma);
+			radius_ = int(taps_.size() / 2);
+			ring_ = Floats(size_t(2 * radius_ + 1) * size_t(width));
+			line_ = Floats(size_t(width + 2 * radius_));
+			source_ = [rows](int y) mutable { return rows(y); };
+			return;
+		}
+		/* No blur, or a wide one on a picture too small to shrink: the
+		 * whole plane. */
+		whole_ = Plane(width, height);
+		for (int y = 0; y < height; ++y) {
+			const float *src = rows(y);
+			std::copy(src, src + width, whole_.row(y));
+		}
+		gaussian_blur_full(whole_, sigma);
+	}
+
+	void row(int y, float *dst)
+	{
+		if (expander_) {
+			expander_->row(y, dst);
+			return;
+		}
+		if (!ring_.empty()) {
+			convolve(y, dst);
+			return;
+		}
+		std::copy(whole_.row(y), whole_.row(y) + width_, dst);
+	}
+
+private:
+	/* Row j blurred across into its ring slot: the row widened by its
+	 * edge values, then the taps added in order over the whole row. */
+	void across(int j)
+	{
+		const float *src = source_(j);
+		const int r = radius_;
+		std::fill(line_.begin(), line_.begin() + r, src[0]);
+		std::copy(src, src + width_, line_.begin() + r);
+		std::fill(line_.begin() + r + width_, line_.end(), src[width_ - 1]);
+		float *dst = &ring_[size_t(j % (2 * r + 1)) * size_t(width_)];
+		std::fill(dst, dst + width_, 0.f);
+		for (int k = 0; k <= 2 * r; ++k) {
+			const float *shifted = &line_[size_t(k)];
+			const float weight = taps_[size_t(k)];
+			for (int x = 0; x < width_; ++x)
 				dst[x] += shifted[x] * weight;
 		}
 	}
-	for (int y = 0; y < h; ++y) {
-		float *dst = &p.v[size_t(y) * size_t(w)];
-		std::fill(dst, dst + w, 0.f);
-		for (int k = -radius; k <= radius; ++k) {
-			const float *src = &tmp.v[size_t(std::clamp(y + k, 0, h - 1)) * size_t(w)];
-			const float weight = kernel[size_t(k + radius)];
-			for (int x = 0; x < w; ++x)
+
+	void convolve(int y, float *dst)
+	{
+		const int r = radius_;
+		while (blurred_to_ < std::min(y + r, height_ - 1))
+			across(++blurred_to_);
+		std::fill(dst, dst + width_, 0.f);
+		for (int k = -r; k <= r; ++k) {
+			const int j = std::clamp(y + k, 0, height_ - 1);
+			const float *src = &ring_[size_t(j % (2 * r + 1)) * size_t(width_)];
+			const float weight = taps_[size_t(k + r)];
+			for (int x = 0; x < width_; ++x)
 				dst[x] += src[x] * weight;
 		}
 	}
+
+	int width_, height_;
+	Plane small_, whole_;
+	std::unique_ptr<Expander> expander_;
+	std::vector<float> taps_;
+	int radius_ = 0;
+	int blurred_to_ = -1;
+	Floats ring_, line_;
+	std::function<const float *(int)> source_;
+};
+
+/* Direct separable convolution with a sampled Gaussian, in place. */
+inline void gaussian_blur_kernel(Plane &p, float sigma)
+{
+	Plane blurred(p.width, p.height);
+	BlurredRows rows(p.width, p.height, sigma, [&](int y) { return p.row(y); });
+	for (int y = 0; y < p.height; ++y)
+		rows.row(y, blurred.row(y));
+	p.v.swap(blurred.v);
 }
 
-/* Gaussian blur at full resolution: the exact kernel when narrow, three
- * box passes (each of variance r(r+1)/3) when wide. */
 inline void gaussian_blur_full(Plane &p, float sigma)
 {
 	if (sigma <= 0.f)
@@ -282,102 +561,45 @@ inline void gaussian_blur_full(Plane &p, float sigma)
 	}
 }
 
-/* Mean of each factor x factor block (the last ones partial). */
-inline Plane shrink(const Plane &p, int factor)
+/* Gaussian blur of `src` into `dst` (the same size). */
+inline void gaussian_blur(const Plane &src, Plane &dst, float sigma)
 {
-	Plane small((p.width + factor - 1) / factor, (p.height + factor - 1) / factor);
-	std::vector<float> row_sum(size_t(small.width));
-	for (int sy = 0; sy < small.height; ++sy) {
-		std::fill(row_sum.begin(), row_sum.end(), 0.f);
-		const int y0 = sy * factor, y1 = std::min(y0 + factor, p.height);
-		for (int y = y0; y < y1; ++y) {
-			const float *src = &p.v[size_t(y) * size_t(p.width)];
-			if (factor == 2) {
-				/* The common case, without the inner loop's overhead. */
-				const int pairs = p.width / 2;
-				for (int sx = 0; sx < pairs; ++sx)
-					row_sum[size_t(sx)] += src[2 * sx] + src[2 * sx + 1];
-				if (p.width % 2)
-					row_sum[size_t(pairs)] += src[p.width - 1];
-				continue;
-			}
-			for (int sx = 0; sx < small.width; ++sx) {
-				const int x0 = sx * factor, x1 = std::min(x0 + factor, p.width);
-				float sum = 0.f;
-				for (int x = x0; x < x1; ++x)
-					sum += src[x];
-				row_sum[size_t(sx)] += sum;
-			}
-		}
-		float *dst = &small.v[size_t(sy) * size_t(small.width)];
-		for (int sx = 0; sx < small.width; ++sx) {
-			const int columns = std::min(factor, p.width - sx * factor);
-			dst[sx] = row_sum[size_t(sx)] / float(columns * (y1 - y0));
-		}
-	}
-	return small;
+	BlurredRows rows(src.width, src.height, sigma, [&](int y) { return src.row(y); });
+	for (int y = 0; y < src.height; ++y)
+		rows.row(y, dst.row(y));
 }
 
-/* Bilinear enlargement of a shrunk plane back over `p`. */
-inline void expand_into(const Plane &small, int factor, Plane &p)
-{
-	const float inverse = 1.f / float(factor);
-	std::vector<int> x0(size_t(p.width)), x1(size_t(p.width));
-	std::vector<float> fx(size_t(p.width));
-	for (int x = 0; x < p.width; ++x) {
-		float sx = std::clamp((float(x) + 0.5f) * inverse - 0.5f, 0.f, float(small.width - 1));
-		x0[size_t(x)] = int(sx);
-		x1[size_t(x)] = std::min(int(sx) + 1, small.width - 1);
-		fx[size_t(x)] = sx - float(int(sx));
-	}
-	for (int y = 0; y < p.height; ++y) {
-		float sy = std::clamp((float(y) + 0.5f) * inverse - 0.5f, 0.f, float(small.height - 1));
-		int y0 = int(sy), y1 = std::min(y0 + 1, small.height - 1);
-		float fy = sy - float(y0);
-		const float *top = &small.v[size_t(y0) * size_t(small.width)];
-		const float *bottom = &small.v[size_t(y1) * size_t(small.width)];
-		float *dst = &p.v[size_t(y) * size_t(p.width)];
-		for (int x = 0; x < p.width; ++x) {
-			size_t a = size_t(x0[size_t(x)]), b = size_t(x1[size_t(x)]);
-			float t = top[a] + (top[b] - top[a]) * fx[size_t(x)];
-			float u = bottom[a] + (bottom[b] - bottom[a]) * fx[size_t(x)];
-			dst[x] = t + (u - t) * fy;
-		}
-	}
-}
-
-/* Gaussian blur; a wide one is computed on a shrunk copy, where it costs a
- * fraction and looks the same. */
+/* Gaussian blur in place. */
 inline void gaussian_blur(Plane &p, float sigma)
 {
-	const int factor = std::min({int(sigma / 1.6f), p.width, p.height});
-	if (factor < 2) {
-		gaussian_blur_full(p, sigma);
-		return;
-	}
-	Plane small = shrink(p, factor);
-	gaussian_blur_full(small, std::sqrt(std::max(0.f, sigma * sigma - float(factor * factor) / 4.f)) / float(factor));
-	expand_into(small, factor, p);
+	Plane blurred(p.width, p.height);
+	gaussian_blur(p, blurred, sigma);
+	p.v.swap(blurred.v);
 }
 
-/* Sobel gradient magnitude of a plane, the border repeated. */
-inline Plane sobel_magnitude(const Plane &p)
+/* Sobel gradient magnitude of a plane into `g` (the same size, not the
+ * plane itself), the border repeated. */
+inline void sobel_magnitude(const Plane &p, Plane &g)
 {
 	const int w = p.width, h = p.height;
-	Plane g(w, h);
 	for (int y = 0; y < h; ++y) {
-		const float *up = &p.v[size_t(std::max(y - 1, 0)) * size_t(w)];
-		const float *mid = &p.v[size_t(y) * size_t(w)];
-		const float *down = &p.v[size_t(std::min(y + 1, h - 1)) * size_t(w)];
-		float *mag = &g.v[size_t(y) * size_t(w)];
-		for (int x = 0; x < w; ++x) {
-			int l = std::max(x - 1, 0), r = std::min(x + 1, w - 1);
+		const float *up = p.row(std::max(y - 1, 0));
+		const float *mid = p.row(y);
+		const float *down = p.row(std::min(y + 1, h - 1));
+		float *mag = g.row(y);
+		auto at = [&](int x, int l, int r) {
 			float dx = (up[r] + 2.f * mid[r] + down[r]) - (up[l] + 2.f * mid[l] + down[l]);
 			float dy = (down[l] + 2.f * down[x] + down[r]) - (up[l] + 2.f * up[x] + up[r]);
 			mag[x] = std::sqrt(dx * dx + dy * dy);
-		}
+		};
+		/* The two edge columns apart, so that the inner ones read in
+		 * order. */
+		at(0, 0, std::min(1, w - 1));
+		for (int x = 1; x < w - 1; ++x)
+			at(x, x - 1, x + 1);
+		if (w > 1)
+			at(w - 1, w - 2, w - 1);
 	}
-	return g;
 }
 
 /* Runs a function and turns an allocation failure into a result code, so

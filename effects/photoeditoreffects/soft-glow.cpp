@@ -12,6 +12,9 @@ void shrunk_highlights(const unsigned char *in, int width, int height, int facto
 	std::vector<float> row[3];
 	for (auto &r : row)
 		r.resize(size_t(sw));
+	kit::Floats weighted[3];
+	for (auto &w : weighted)
+		w.resize(size_t(width));
 	for (int sy = 0; sy < sh; ++sy) {
 		for (auto &r : row)
 			std::fill(r.begin(), r.end(), 0.f);
@@ -21,11 +24,15 @@ void shrunk_highlights(const unsigned char *in, int width, int height, int facto
 			for (int x = 0; x < width; ++x, px += 4) {
 				float b = px[0], g = px[1], r = px[2];
 				float keep = kit::smoothstep(110.f, 240.f, 0.299f * r + 0.587f * g + 0.114f * b);
-				const size_t s = size_t(x / factor);
-				row[0][s] += r * keep;
-				row[1][s] += g * keep;
-				row[2][s] += b * keep;
+				weighted[0][size_t(x)] = r * keep;
+				weighted[1][size_t(x)] = g * keep;
+				weighted[2][size_t(x)] = b * keep;
 			}
+			/* Added block by block in the order of the pixels. */
+			for (int c = 0; c < 3; ++c)
+				for (int sx = 0, x = 0; sx < sw; ++sx)
+					for (const int end = std::min(x + factor, width); x < end; ++x)
+						row[c][size_t(sx)] += weighted[c][size_t(x)];
 		}
 		for (int sx = 0; sx < sw; ++sx) {
 			const float count = float(std::min(factor, width - sx * factor) * (y1 - y0));
@@ -34,6 +41,66 @@ void shrunk_highlights(const unsigned char *in, int width, int height, int facto
 		}
 	}
 }
+
+} // namespace
+
+namespace {
+
+inline int soft_glow_body(const unsigned char *in, unsigned char *out, int width, int height, int level)
+{
+	return kit::guarded([&] {
+		const float strength = float(level) / 100.f;
+		const float extent = float(std::max(width, height));
+
+		/* The glow is wide: worked out on a grid a few times coarser. */
+		const float glow_sigma = extent / 70.f;
+		const int factor = std::clamp(int(glow_sigma / 1.6f), 1, std::min(width, height));
+		kit::Rgb small((width + factor - 1) / factor, (height + factor - 1) / factor);
+		kit::Plane *small_planes[3] = {&small.r, &small.g, &small.b};
+		shrunk_highlights(in, width, height, factor, small_planes);
+
+		const float soften = 0.6f * strength;
+		const float bloom_gain = 1.1f * strength;
+		const float bloom_cap = 255.f * strength;
+		constexpr float INVERSE_255 = 1.f / 255.f;
+		kit::Floats rows(size_t(width) * 2);
+		float *soft = rows.data(), *glow = soft + width;
+		/* Red, green and blue are bytes 2, 1 and 0. */
+		for (int c = 0; c < 3; ++c) {
+			const int byte = 2 - c;
+			kit::gaussian_blur_full(*small_planes[c], glow_sigma / float(factor));
+			kit::Expander glow_rows(*small_planes[c], factor, width, height);
+			kit::BlurredRows soft_rows(width, height, std::max(1.f, extent / 400.f), kit::ChannelRows(in, width, 4, byte));
+			for (int y = 0; y < height; ++y) {
+				soft_rows.row(y, soft);
+				glow_rows.row(y, glow);
+				const unsigned char *src = in + size_t(y) * size_t(width) * 4 + byte;
+				unsigned char *dst = out + size_t(y) * size_t(width) * 4 + byte;
+				for (int x = 0; x < width; ++x) {
+					float o = src[size_t(x) * 4];
+					float base = o + (soft[x] - o) * soften;
+					float bloom = std::min(bloom_cap, glow[x] * bloom_gain);
+					dst[size_t(x) * 4] = kit::clamp_byte(255.f - (255.f - base) * (255.f - bloom) * INVERSE_255);
+				}
+			}
+		}
+		for (size_t i = 0; i < size_t(width) * size_t(height); ++i)
+			out[i * 4 + 3] = 255;
+		return int(kit::RESULT_OK);
+	});
+}
+
+int soft_glow_reference(const unsigned char *in, unsigned char *out, int width, int height, int level)
+{
+	return soft_glow_body(in, out, width, height, level);
+}
+
+#if KIT_X86
+__attribute__((target("avx2"), flatten)) int soft_glow_avx2(const unsigned char *in, unsigned char *out, int width, int height, int level)
+{
+	return soft_glow_body(in, out, width, height, level);
+}
+#endif
 
 } // namespace
 
@@ -47,42 +114,9 @@ int applySoftglow(const unsigned char *in, unsigned char *out, int width, int he
 {
 	if (!pee::bgra_arguments_usable(in, out, width, height) || level < 0 || level > 100)
 		return kit::RESULT_BAD_ARGUMENT;
-	return kit::guarded([&] {
-		const float strength = float(level) / 100.f;
-		const float extent = float(std::max(width, height));
-		kit::Rgb picture = kit::read_rgb(in, width, height, 4, 2, 1, 0);
-		kit::Plane *planes[3] = {&picture.r, &picture.g, &picture.b};
-
-		/* The glow is wide: worked out on a grid a few times coarser. */
-		const float glow_sigma = extent / 70.f;
-		const int factor = std::clamp(int(glow_sigma / 1.6f), 1, std::min(width, height));
-		kit::Rgb small((width + factor - 1) / factor, (height + factor - 1) / factor);
-		kit::Plane *small_planes[3] = {&small.r, &small.g, &small.b};
-		shrunk_highlights(in, width, height, factor, small_planes);
-		kit::Rgb glow(width, height);
-		kit::Plane *glow_planes[3] = {&glow.r, &glow.g, &glow.b};
-		for (int c = 0; c < 3; ++c) {
-			kit::gaussian_blur_full(*small_planes[c], glow_sigma / float(factor));
-			kit::expand_into(*small_planes[c], factor, *glow_planes[c]);
-		}
-
-		const float soften = 0.6f * strength;
-		const float bloom_gain = 1.1f * strength;
-		constexpr float INVERSE_255 = 1.f / 255.f;
-		for (int c = 0; c < 3; ++c) {
-			kit::Plane soft = *planes[c];
-			kit::gaussian_blur(soft, std::max(1.f, extent / 400.f));
-			float *o = planes[c]->v.data();
-			const float *s = soft.v.data();
-			const float *g = glow_planes[c]->v.data();
-			const size_t n = planes[c]->v.size();
-			for (size_t i = 0; i < n; ++i) {
-				float base = o[i] + (s[i] - o[i]) * soften;
-				float bloom = std::min(255.f * strength, g[i] * bloom_gain);
-				o[i] = 255.f - (255.f - base) * (255.f - bloom) * INVERSE_255;
-			}
-		}
-		kit::write_rgb(picture, out, 4, 2, 1, 0);
-		return int(kit::RESULT_OK);
-	});
+#if KIT_X86
+	if (kit::best_path() == kit::Path::AVX2)
+		return soft_glow_avx2(in, out, width, height, level);
+#endif
+	return soft_glow_reference(in, out, width, height, level);
 }

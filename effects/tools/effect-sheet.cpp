@@ -12,6 +12,7 @@
 #include <string>
 #include <vector>
 
+#include "effect-sheet-layout.h"
 #include "ie-engine.h"
 
 #ifndef EFFECT_SHEET_DEFAULT_PICTURE
@@ -23,43 +24,8 @@
 
 namespace {
 
-constexpr int TILE_WIDTH = 320;
-constexpr int COLUMNS = 7;
-constexpr int GAP = 14;
-constexpr int LABEL_HEIGHT = 30;
 constexpr int FONT_SIZE = 15;
 constexpr const char *FONT = "DejaVu Sans:style=Bold";
-
-struct Tile {
-	const char *label;
-	int effect; /* -1: the original */
-};
-
-/* Catalogue rows 1 to 20, in the order the effect grid shows them. */
-constexpr Tile TILES[] = {
-	{"Original", -1},
-	{"Vintage", IE_EFFECT_VINTAGE},
-	{"Sunshine", IE_EFFECT_SUNSHINE},
-	{"Nostalgia", IE_EFFECT_NOSTALGIA},
-	{"Yellow glow", IE_EFFECT_YELLOW_GLOW},
-	{"Blur", IE_EFFECT_BLUR},
-	{"Soft glow", IE_EFFECT_SOFT_GLOW},
-	{"Old photo", IE_EFFECT_OLD_PHOTO},
-	{"Retro", IE_EFFECT_RETRO},
-	{"Greyscale", IE_EFFECT_GREYSCALE},
-	{"Sepia", IE_EFFECT_SEPIA},
-	{"Faded colours", IE_EFFECT_FADED_COLOURS},
-	{"Downlight", IE_EFFECT_DOWNLIGHT},
-	{"Sharpen", IE_EFFECT_SHARPEN},
-	{"Sketch", IE_EFFECT_SKETCH},
-	{"Negative", IE_EFFECT_NEGATIVE},
-	{"Oil paint", IE_EFFECT_OIL_PAINT},
-	{"Posterise", IE_EFFECT_POSTERISE},
-	{"Cartoon", IE_EFFECT_CARTOON},
-	{"Pop art", IE_EFFECT_POP_ART},
-	{"Magic pen", IE_EFFECT_MAGIC_PEN},
-};
-constexpr int TILE_COUNT = int(sizeof(TILES) / sizeof(TILES[0]));
 
 struct Picture {
 	int width = 0;
@@ -140,9 +106,8 @@ int run(const char *picture_path, const char *out_path)
 		return 1;
 	}
 
-	const int rows = (TILE_COUNT + COLUMNS - 1) / COLUMNS;
 	const int sheet_width = GAP + COLUMNS * (tile.width + GAP);
-	const int sheet_height = GAP + rows * (tile.height + LABEL_HEIGHT + GAP);
+	const int sheet_height = GAP + ROWS * (tile.height + LABEL_HEIGHT + GAP);
 	Ecore_Evas *canvas = ecore_evas_buffer_new(sheet_width, sheet_height);
 	if (!canvas) {
 		std::fprintf(stderr, "effect-sheet: no %dx%d canvas\n", sheet_width, sheet_height);
@@ -163,8 +128,8 @@ int run(const char *picture_path, const char *out_path)
 			if (code != IEL_OK)
 				std::fprintf(stderr, "effect-sheet: %s failed (%d)\n", TILES[i].label, code);
 		}
-		int x = GAP + (i % COLUMNS) * (tile.width + GAP);
-		int y = GAP + (i / COLUMNS) * (tile.height + LABEL_HEIGHT + GAP);
+		int x = 0, y = 0;
+		tile_origin(i, tile.width, tile.height, &x, &y);
 		add_tile(evas, result, TILES[i].label, x, y);
 	}
 

@@ -126,6 +126,11 @@ struct NamedEffect {
 	bool tone;
 };
 
+inline void PrintTo(const NamedEffect &e, std::ostream *os)
+{
+	*os << e.name;
+}
+
 /* Every effect at the level or option the editor uses. */
 inline const std::vector<NamedEffect> &all_effects()
 {

@@ -2,7 +2,7 @@
  * definition, borders included. */
 #include <gtest/gtest.h>
 
-#include "engine-effects.h"
+#include "kuwahara.h"
 #include "effects-test-util.h"
 
 namespace {
@@ -53,11 +53,15 @@ TEST(Kuwahara, MatchesThePlainDefinition)
 	for (const auto &size : sizes) {
 		const int w = size[0], h = size[1];
 		const std::vector<uint8_t> rgb = effects_test::bgra_to_rgb(effects_test::photo(w, h));
-		for (int radius : {1, 2, 5}) {
-			const kit::Rgb fast = pee::kuwahara(rgb.data(), w, h, radius);
+		for (int radius : {1, 2, 5, 12}) {
 			const kit::Rgb plain = plain_kuwahara(rgb, w, h, radius);
-			EXPECT_TRUE(fast.r.v == plain.r.v && fast.g.v == plain.g.v && fast.b.v == plain.b.v)
-				<< w << "x" << h << " radius " << radius;
+			for (kit::Path path : {kit::Path::REFERENCE, kit::Path::AVX2}) {
+				if (path == kit::Path::AVX2 && !__builtin_cpu_supports("avx2"))
+					continue;
+				const kit::Rgb fast = pee::kuwahara(rgb.data(), w, h, radius, path);
+				EXPECT_TRUE(fast.r.v == plain.r.v && fast.g.v == plain.g.v && fast.b.v == plain.b.v)
+					<< w << "x" << h << " radius " << radius << " path " << int(path);
+			}
 		}
 	}
 }
