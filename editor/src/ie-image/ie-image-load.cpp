@@ -551,3 +551,51 @@ void *ie_image_data_get(Evas_Object *obj)
 	IE_CHECK_NULL(sd);
 	return evas_object_image_data_get(sd->image, EINA_TRUE);
 }
+
+void _own_pixels_release_unshown(Mainimg_Smart_Data *sd)
+{
+	if (!sd->own_pixels || (sd->image && evas_object_image_data_get(sd->image, EINA_FALSE) == sd->own_pixels))
+		return;
+	free(sd->own_pixels);
+	sd->own_pixels = NULL;
+}
+
+/* Evas shows pixels given with evas_object_image_data_set as they are and
+ * never frees them; putting a picture in Evas's own buffer instead costs a
+ * copy into fresh pages, page faults included. */
+Eina_Bool ie_image_pixels_take(Evas_Object *obj, void *pixels, int w, int h)
+{
+	/* Ours from here on, whatever happens. */
+	std::unique_ptr<void, decltype(&free)> taken(pixels, free);
+	IE_CHECK_VAL(obj, EINA_FALSE);
+	IE_CHECK_VAL(pixels, EINA_FALSE);
+	Mainimg_Smart_Data *sd = _mainimg_data_get(obj);
+	IE_CHECK_VAL(sd, EINA_FALSE);
+
+	/* The old picture goes: Evas frees its own pixels, the main image its
+	 * earlier buffer unless it comes back reworked. */
+	Evas_Object *image = sd->image;
+	evas_object_image_data_set(image, NULL);
+	void *earlier = sd->own_pixels;
+	sd->own_pixels = NULL;
+	if (earlier != pixels)
+		free(earlier);
+	evas_object_image_size_set(image, w, h);
+	/* Evas reads the rows at its own stride. */
+	if (w <= 0 || h <= 0 || evas_object_image_stride_get(image) != w * 4) {
+		IE_LOG_E("Cannot show a %dx%d picture", w, h);
+		return EINA_FALSE;
+	}
+	evas_object_image_data_set(image, pixels);
+	evas_object_image_data_update_add(image, 0, 0, w, h);
+	sd->own_pixels = taken.release();
+	return EINA_TRUE;
+}
+
+Eina_Bool ie_image_pixels_owned(Evas_Object *obj, const void *pixels)
+{
+	IE_CHECK_VAL(obj, EINA_FALSE);
+	Mainimg_Smart_Data *sd = _mainimg_data_get(obj);
+	IE_CHECK_VAL(sd, EINA_FALSE);
+	return pixels && pixels == sd->own_pixels;
+}

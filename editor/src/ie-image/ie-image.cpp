@@ -348,6 +348,7 @@ static void _mainimg_smart_del(Evas_Object *obj)
 		evas_object_del(sd->image);
 		sd->image = NULL;
 	}
+	_own_pixels_release_unshown(sd);
 	if (sd->gesture) {
 		Evas_Object *gesture = sd->gesture;
 		sd->gesture = NULL;
@@ -541,6 +542,8 @@ void ie_image_size_update(Evas_Object *obj)
 	IE_CHECK(obj);
 	Mainimg_Smart_Data *sd = _mainimg_data_get(obj);
 	IE_CHECK(sd);
+	/* A view that put new pixels in through Evas comes here next. */
+	_own_pixels_release_unshown(sd);
 	evas_object_image_size_get(sd->image, &sd->img_w, &sd->img_h);
 	sd->fitted = EINA_TRUE;
 	evas_object_smart_changed(obj);
