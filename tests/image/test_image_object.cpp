@@ -168,17 +168,24 @@ TEST_F(MainImageObject, HandedOverPixelsAreShownAsTheyAreAndFreedOnceReplaced)
 	EXPECT_FALSE(ie_image_pixels_owned(obj_, first));
 
 	/* Pixels put in through Evas, as the rotate and effect views do: the
-	 * buffer goes once the new size is taken in. */
-	evas_object_image_data_set(image, NULL);
-	evas_object_image_size_set(image, 30, 30);
-	void *evas_pixels = evas_object_image_data_get(image, EINA_TRUE);
-	ASSERT_NE(evas_pixels, nullptr);
-	memset(evas_pixels, 0xff, 30 * 30 * 4);
-	evas_object_image_data_set(image, evas_pixels);
-	ie_image_size_update(obj_);
-	EXPECT_EQ(sd()->own_pixels, nullptr);
-	settle();
-	EXPECT_EQ(screen_pixel(win(), 180, 400), 0xffffffffu);
+	 * buffer goes as soon as the picture takes another size, or with the
+	 * size update that follows a picture of the same size. */
+	for (int side : {40, 30}) {
+		ASSERT_TRUE(ie_image_pixels_take(obj_, halves(30, 30), 30, 30));
+		evas_object_image_data_set(image, NULL);
+		evas_object_image_size_set(image, side, side);
+		if (side != 30) {
+			EXPECT_EQ(sd()->own_pixels, nullptr);
+		}
+		void *evas_pixels = evas_object_image_data_get(image, EINA_TRUE);
+		ASSERT_NE(evas_pixels, nullptr);
+		memset(evas_pixels, 0xff, static_cast<size_t>(side) * side * 4);
+		evas_object_image_data_set(image, evas_pixels);
+		ie_image_size_update(obj_);
+		EXPECT_EQ(sd()->own_pixels, nullptr);
+		settle();
+		EXPECT_EQ(screen_pixel(win(), 180, 400), 0xffffffffu);
+	}
 
 	/* A size Evas cannot take is refused: both buffers are freed. */
 	ASSERT_TRUE(ie_image_pixels_take(obj_, halves(10, 10), 10, 10));
