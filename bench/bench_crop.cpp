@@ -312,8 +312,9 @@ void done_crop_rounds(benchmark::State &state, Restore restore)
 		bench::report_ratio(state, "x_memcpy", total / static_cast<double>(state.iterations()), "memcpy-cropped");
 }
 
-/* The picture as Evas holds it after loading, a rotation or an effect: the
- * crop is copied out of it and Evas's buffer is released. */
+/* The picture as Evas holds it after a rotation or an effect, or loaded at
+ * its own size: the crop is copied out of it and Evas's buffer is
+ * released. */
 void Editor_DoneCrop_1280x960_To_640x480(benchmark::State &state)
 {
 	done_crop_rounds(state, [](Evas_Object *main_image, const std::vector<uint8_t> &whole) {
@@ -327,8 +328,9 @@ void Editor_DoneCrop_1280x960_To_640x480(benchmark::State &state)
 	});
 }
 
-/* The picture in the editor's own buffer, as after an earlier crop: the
- * crop happens where the picture lies. */
+/* The picture in the editor's own buffer, as loaded reduced or turned
+ * upright, or after an earlier crop: the crop happens where the picture
+ * lies. */
 void Editor_DoneCropAgain_1280x960_To_640x480(benchmark::State &state)
 {
 	done_crop_rounds(state, [](Evas_Object *main_image, const std::vector<uint8_t> &whole) {
