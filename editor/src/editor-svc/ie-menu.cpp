@@ -165,10 +165,10 @@ void __apply_crop(Viewhandle *vh)
 		return;
 	}
 	/* The region goes on screen without another copy: the main image takes
-	 * it over. A picture already in the main image's own buffer (one
-	 * cropped before) is cropped where it lies; one that Evas holds is
-	 * copied out once, into memory that is not zero-filled first since
-	 * the crop writes every byte. */
+	 * it over. A picture in the main image's own buffer (loaded reduced or
+	 * turned upright, or cropped before) is cropped where it lies; one
+	 * that Evas holds is copied out once, into memory that is not
+	 * zero-filled first since the crop writes every byte. */
 	const bool in_place = ie_image_pixels_owned(vh->main_image, pixels);
 	uint8_t *cropped = in_place ? pixels : static_cast<uint8_t *>(malloc(static_cast<size_t>(cw) * ch * 4));
 	if (!cropped) {
