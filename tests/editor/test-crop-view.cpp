@@ -304,6 +304,50 @@ TEST_F(CropView, DoneCropsThePictureAndTheNextDoneSavesIt)
 	EXPECT_EQ(row.height, ch);
 }
 
+TEST_F(CropView, ASecondCropCutsTheCroppedPictureWhereItLies)
+{
+	ASSERT_NE(open_editor_on_picture(4000, 3000), nullptr);
+	open_crop();
+	drag_box(1.0, 1.0, -200, -150);
+	tap_button(vh->done_btn);
+	const void *first = evas_object_image_data_get(inner_image(), EINA_FALSE);
+
+	open_crop();
+	drag_box(0.0, 0.0, 100, 80);
+	int cw, ch;
+	const auto expected = expected_crop(region(), &cw, &ch);
+	tap_button(vh->done_btn);
+	int w, h;
+	picture_size(&w, &h);
+	ASSERT_EQ(w, cw);
+	ASSERT_EQ(h, ch);
+	EXPECT_TRUE(picture_pixels() == expected);
+	EXPECT_EQ(evas_object_image_data_get(inner_image(), EINA_FALSE), first) << "no new memory";
+
+	/* On screen it is the new picture, not what the buffer held before:
+	 * its corners and middle show the colours of the crop's own. */
+	const Rect p = shown();
+	for (const auto &f : {std::pair{0.02, 0.02}, std::pair{0.5, 0.5}, std::pair{0.97, 0.97}}) {
+		const uint32_t want = expected[static_cast<size_t>(f.second * ch) * cw + static_cast<size_t>(f.first * cw)];
+		const uint32_t got = iet::screen_pixel(win(), p.x + static_cast<int>(f.first * p.w),
+						       p.y + static_cast<int>(f.second * p.h));
+		EXPECT_LT(worst_difference(&got, &want, 1), 8) << std::hex << got << " for " << want;
+	}
+
+	tap_button(vh->done_btn);
+	ASSERT_EQ(close_requests.size(), 1u);
+	Evas_Object *check = evas_object_image_add(evas());
+	evas_object_image_file_set(check, close_requests[0].c_str(), nullptr);
+	int sw = 0, sh = 0;
+	evas_object_image_size_get(check, &sw, &sh);
+	EXPECT_EQ(sw, cw);
+	EXPECT_EQ(sh, ch);
+	auto *pixels = static_cast<const uint32_t *>(evas_object_image_data_get(check, EINA_FALSE));
+	ASSERT_NE(pixels, nullptr);
+	EXPECT_LT(worst_difference(pixels, expected.data(), expected.size()), 40);
+	evas_object_del(check);
+}
+
 TEST_F(CropView, AnAppliedCropIsNeverForgotten)
 {
 	ASSERT_NE(open_editor_on_picture(640, 480), nullptr);

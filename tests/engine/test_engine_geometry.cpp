@@ -166,6 +166,42 @@ TEST(EngineCrop, CopiesTheRegionAndRefusesOneOutsideTheSource)
 	}
 }
 
+TEST(EngineCrop, InItsOwnBufferGivesTheCopysPixels)
+{
+	/* Every size from one pixel, odd widths, regions at each edge and the
+	 * whole picture, for pixels of 2, 3 and 4 bytes: the packed rows at
+	 * the buffer's start equal the copy into a buffer of its own. */
+	uint32_t seed = 1;
+	for (size_t b : {2, 3, 4}) {
+		const int format = b == 2 ? IEL_FORMAT_RGB565 : b == 3 ? IEL_FORMAT_RGB888 : IEL_FORMAT_BGRA8888;
+		for (uint32_t w : {1u, 2u, 7u, 33u}) {
+			for (uint32_t h : {1u, 3u, 16u}) {
+				const Picture picture = random_picture(w, h, seed++, format, b);
+				for (uint32_t cw = 1; cw <= w; cw += (w > 8 ? 5 : 1)) {
+					for (uint32_t ch = 1; ch <= h; ch += (h > 8 ? 4 : 1)) {
+						for (int x : {0, int(w - cw) / 2, int(w - cw)}) {
+							for (int y : {0, int(h - ch)}) {
+								Picture copy(cw, ch, format, b), in_place(picture);
+								ASSERT_EQ(IEL_Crop_Image(&picture.record, &copy.record, x, y), IEL_OK);
+								IEL_Image region = in_place.record;
+								region.u32Width = cw;
+								region.u32Height = ch;
+								ASSERT_EQ(IEL_Crop_Image(&in_place.record, &region, x, y), IEL_OK);
+								const size_t n = cw * ch * b;
+								ASSERT_TRUE(std::equal(copy.bytes.begin(), copy.bytes.begin() + n,
+										       in_place.bytes.begin()))
+									<< b << " bytes, " << w << "x" << h << " -> " << cw << "x" << ch
+									<< " at " << x << "," << y;
+								ASSERT_TRUE(in_place.guard_intact());
+							}
+						}
+					}
+				}
+			}
+		}
+	}
+}
+
 /* Each routine refuses a missing record, missing pixels, an empty source,
  * an unknown format and a size whose byte count overflows, and writes
  * nothing. -1: the routine does not look at that. */

@@ -1,5 +1,11 @@
-/* The main image object in a headless window: fitting, and zoom and pan
- * driven by real mouse and multi-touch events through its gesture layer. */
+/* The main image object in a headless window: fitting, zoom and pan driven
+ * by real mouse and multi-touch events through its gesture layer, and
+ * pixels handed over to it. */
+#include <platform_log.h>
+
+#include <cstdlib>
+#include <cstring>
+
 #include "image_test_fixture.h"
 
 namespace iet {
@@ -114,6 +120,85 @@ TEST_F(MainImageObject, CropModePansWithTwoFingersOnly)
 	two_finger_drag(win(), 100, 400, 60, 60, 0);
 	EXPECT_NE(shown().x, -270);
 	EXPECT_EQ(shown().w, 1440);
+}
+
+/* A malloc'd picture, left half red and right half blue. */
+static uint32_t *halves(int w, int h)
+{
+	auto *pixels = static_cast<uint32_t *>(malloc(static_cast<size_t>(w) * h * 4));
+	for (int y = 0; y < h; y++)
+		for (int x = 0; x < w; x++)
+			pixels[y * w + x] = x < w / 2 ? 0xffff0000 : 0xff0000ff;
+	return pixels;
+}
+
+TEST_F(MainImageObject, HandedOverPixelsAreShownAsTheyAreAndFreedOnceReplaced)
+{
+	/* Under ASan the frees below are checked too: a buffer freed twice,
+	 * or one never freed, fails the run. */
+	load_picture(400, 200);
+	uint32_t *first = halves(40, 20);
+	ASSERT_TRUE(ie_image_pixels_take(obj_, first, 40, 20));
+	ie_image_size_update(obj_);
+	settle();
+	Evas_Object *image = ie_image_object_get(obj_);
+	EXPECT_EQ(evas_object_image_data_get(image, EINA_FALSE), first) << "shown without a copy";
+	EXPECT_EQ(pixel_size(), (Rect{ 0, 0, 40, 20 }));
+	EXPECT_TRUE(ie_image_pixels_owned(obj_, first));
+	/* Fitted 360 x 180 at (0, 310): a quarter and three quarters across. */
+	EXPECT_EQ(screen_pixel(win(), 90, 400), 0xffff0000u);
+	EXPECT_EQ(screen_pixel(win(), 270, 400), 0xff0000ffu);
+
+	/* Reworked in place: the right half, moved to the buffer's start. */
+	auto *pixels = static_cast<uint32_t *>(ie_image_data_get(obj_));
+	ASSERT_EQ(pixels, first);
+	for (int y = 0; y < 20; y++)
+		memmove(pixels + y * 20, pixels + y * 40 + 20, 20 * 4);
+	ASSERT_TRUE(ie_image_pixels_take(obj_, pixels, 20, 20));
+	ie_image_size_update(obj_);
+	settle();
+	EXPECT_EQ(evas_object_image_data_get(image, EINA_FALSE), first);
+	EXPECT_EQ(pixel_size(), (Rect{ 0, 0, 20, 20 }));
+	/* Fitted 360 x 360 at (0, 220): no red left anywhere on it. */
+	for (int x : {5, 90, 180, 270, 355})
+		EXPECT_EQ(screen_pixel(win(), x, 400), 0xff0000ffu) << x;
+
+	/* Another buffer replaces it: the first is freed. */
+	ASSERT_TRUE(ie_image_pixels_take(obj_, halves(10, 10), 10, 10));
+	EXPECT_FALSE(ie_image_pixels_owned(obj_, first));
+
+	/* Pixels put in through Evas, as the rotate and effect views do: the
+	 * buffer goes as soon as the picture takes another size, or with the
+	 * size update that follows a picture of the same size. */
+	for (int side : {40, 30}) {
+		ASSERT_TRUE(ie_image_pixels_take(obj_, halves(30, 30), 30, 30));
+		evas_object_image_data_set(image, NULL);
+		evas_object_image_size_set(image, side, side);
+		if (side != 30) {
+			EXPECT_EQ(sd()->own_pixels, nullptr);
+		}
+		void *evas_pixels = evas_object_image_data_get(image, EINA_TRUE);
+		ASSERT_NE(evas_pixels, nullptr);
+		memset(evas_pixels, 0xff, static_cast<size_t>(side) * side * 4);
+		evas_object_image_data_set(image, evas_pixels);
+		ie_image_size_update(obj_);
+		EXPECT_EQ(sd()->own_pixels, nullptr);
+		settle();
+		EXPECT_EQ(screen_pixel(win(), 180, 400), 0xffffffffu);
+	}
+
+	/* A size Evas cannot take is refused: both buffers are freed. */
+	ASSERT_TRUE(ie_image_pixels_take(obj_, halves(10, 10), 10, 10));
+	iet::log_clear();
+	EXPECT_FALSE(ie_image_pixels_take(obj_, halves(4, 4), 0, 4));
+	EXPECT_EQ(iet::log_count("Cannot show a 0x4 picture", PLATFORM_LOG_ERROR), 1);
+	EXPECT_EQ(sd()->own_pixels, nullptr);
+
+	/* Deleted while showing one: freed with the object. */
+	ASSERT_TRUE(ie_image_pixels_take(obj_, halves(10, 10), 10, 10));
+	evas_object_del(obj_);
+	obj_ = nullptr;
+	settle();
 }
 
 TEST_F(MainImageObject, ModeSetAppliesOnlyChanges)

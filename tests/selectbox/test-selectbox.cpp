@@ -100,6 +100,40 @@ protected:
 		drag_bottom_right(target.r - target.l - 100, target.b - target.t - 100);
 		ASSERT_EQ(region(), target);
 	}
+	/* Lines, handles at their points - 9 and the four bands up to the
+	 * canvas edges, all where the rectangle puts them. */
+	void expect_members_follow(int canvas_w = 720, int canvas_h = 1280)
+	{
+		const Box b = region();
+		Selectbox_Smart_Data *sd = _selectbox_data_get(box_);
+		const Box lines[] = {{b.l, b.t, b.r, b.t}, {b.l, b.t, b.l, b.b}, {b.l, b.b, b.r, b.b}, {b.r, b.t, b.r, b.b}};
+		for (int i = 0; i < LINE_COUNT; i++) {
+			Box got;
+			evas_object_line_xy_get(sd->lines[i], &got.l, &got.t, &got.r, &got.b);
+			EXPECT_EQ(got, lines[i]) << "line " << i;
+		}
+		const int hw = (b.r - b.l) / 2, hh = (b.b - b.t) / 2;
+		const int points[HANDLE_COUNT][2] = {{b.l, b.t}, {b.r, b.b}, {b.l, b.b}, {b.r, b.t},
+						     {b.l, b.t + hh}, {b.r, b.t + hh}, {b.l + hw, b.b}, {b.l + hw, b.t}};
+		for (int i = 0; i < HANDLE_COUNT; i++) {
+			Evas_Coord x, y, w, h;
+			evas_object_geometry_get(sd->handles[i], &x, &y, &w, &h);
+			EXPECT_EQ(x, points[i][0] - 9) << "handle " << i;
+			EXPECT_EQ(y, points[i][1] - 9) << "handle " << i;
+			EXPECT_EQ(w, 18);
+			EXPECT_EQ(h, 18);
+		}
+		const Geometry shades[] = {{0, 0, canvas_w, b.t}, {b.r, b.t, canvas_w - b.r, b.b - b.t},
+					   {0, b.b, canvas_w, canvas_h - b.b}, {0, b.t, b.l, b.b - b.t}};
+		for (int i = 0; i < SHADE_COUNT; i++) {
+			Evas_Coord x, y, w, h;
+			evas_object_geometry_get(sd->shades[i], &x, &y, &w, &h);
+			EXPECT_EQ(x, shades[i].x) << "shade " << i;
+			EXPECT_EQ(y, shades[i].y) << "shade " << i;
+			EXPECT_EQ(w, shades[i].w) << "shade " << i;
+			EXPECT_EQ(h, shades[i].h) << "shade " << i;
+		}
+	}
 	bool handle_visible(int index) const
 	{
 		Selectbox_Smart_Data *sd = _selectbox_data_get(box_);
@@ -209,40 +243,10 @@ TEST_F(SelectBox, RatioWithoutAShapeIsRefused)
 TEST_F(SelectBox, MembersFollowTheRectangleAndTheCanvasEdges)
 {
 	open({0, 100, 720, 540});
-	const Box b = region();
-	Selectbox_Smart_Data *sd = _selectbox_data_get(box_);
-
-	const Box lines[] = {{b.l, b.t, b.r, b.t}, {b.l, b.t, b.l, b.b}, {b.l, b.b, b.r, b.b}, {b.r, b.t, b.r, b.b}};
-	for (int i = 0; i < LINE_COUNT; i++) {
-		Box got;
-		evas_object_line_xy_get(sd->lines[i], &got.l, &got.t, &got.r, &got.b);
-		EXPECT_EQ(got, lines[i]) << "line " << i;
-	}
-
-	const int hw = (b.r - b.l) / 2, hh = (b.b - b.t) / 2;
-	const int points[HANDLE_COUNT][2] = {{b.l, b.t}, {b.r, b.b}, {b.l, b.b}, {b.r, b.t},
-					     {b.l, b.t + hh}, {b.r, b.t + hh}, {b.l + hw, b.b}, {b.l + hw, b.t}};
-	for (int i = 0; i < HANDLE_COUNT; i++) {
-		Evas_Coord x, y, w, h;
-		evas_object_geometry_get(sd->handles[i], &x, &y, &w, &h);
-		EXPECT_EQ(x, points[i][0] - 9) << "handle " << i;
-		EXPECT_EQ(y, points[i][1] - 9) << "handle " << i;
-		EXPECT_EQ(w, 18);
-		EXPECT_EQ(h, 18);
-	}
-
-	const Geometry shades[] = {{0, 0, 720, b.t}, {b.r, b.t, 720 - b.r, b.b - b.t},
-				   {0, b.b, 720, 1280 - b.b}, {0, b.t, b.l, b.b - b.t}};
-	for (int i = 0; i < SHADE_COUNT; i++) {
-		Evas_Coord x, y, w, h;
-		evas_object_geometry_get(sd->shades[i], &x, &y, &w, &h);
-		EXPECT_EQ(x, shades[i].x) << "shade " << i;
-		EXPECT_EQ(y, shades[i].y) << "shade " << i;
-		EXPECT_EQ(w, shades[i].w) << "shade " << i;
-		EXPECT_EQ(h, shades[i].h) << "shade " << i;
-	}
+	expect_members_follow();
 
 	/* The colour is the outline's; the shades keep their darkening. */
+	Selectbox_Smart_Data *sd = _selectbox_data_get(box_);
 	evas_object_color_set(box_, 10, 20, 30, 255);
 	int r, g, bl, a;
 	evas_object_color_get(sd->lines[LINE_RIGHT], &r, &g, &bl, &a);
@@ -252,6 +256,39 @@ TEST_F(SelectBox, MembersFollowTheRectangleAndTheCanvasEdges)
 	evas_object_color_get(sd->shades[SHADE_BELOW], &r, &g, &bl, &a);
 	EXPECT_EQ(r + g + bl, 0);
 	EXPECT_EQ(a, 102);
+}
+
+TEST_F(SelectBox, EveryLayoutLeavesEachMemberInPlace)
+{
+	/* Later layouts touch only what moved: whatever the drag, no member
+	 * may be left where the previous rectangle had it. */
+	open({60, 200, 600, 800});
+	shape({200, 400, 400, 600});
+	expect_members_follow();
+	const struct {
+		const char *what;
+		int x, y, dx, dy;
+	} strokes[] = {
+		{"bottom-right corner, one pixel", 400, 600, 1, 1},
+		{"bottom-right corner, odd size", 401, 601, 6, 0},
+		{"top-left corner", 200, 400, -13, 7},
+		{"right edge", 407, 504, 22, 0},
+		{"bottom edge", 300, 601, 0, -9},
+		{"inside", 300, 500, 17, -11},
+		{"inside, back", 317, 489, -17, 11},
+	};
+	for (const auto &s : strokes) {
+		SCOPED_TRACE(s.what);
+		const Box before = region();
+		stroke(s.x, s.y, s.dx, s.dy);
+		ASSERT_FALSE(region() == before);
+		expect_members_follow();
+	}
+	/* The bands follow the canvas as well. */
+	resize_window(700, 1200);
+	evas_object_resize(box_, 700, 1200);
+	iet::settle();
+	expect_members_follow(700, 1200);
 }
 
 TEST_F(SelectBox, SameGeometryRequestsNoRecalculation)
@@ -390,9 +427,17 @@ TEST_F(SelectBox, FreeModeEdgesSnapAndTheBoxStaysOnThePicture)
 	iet::settle();
 	EXPECT_EQ(region(), (Box{200, 400, 240, 600}));
 
-	/* Dragged against the picture's right edge it stops flush, same size. */
+	/* Dragged against the picture's right edge it stops flush, same size;
+	 * pushed on against it, nothing changes and nothing is laid out. */
 	shape({200, 400, 400, 600});
 	drag_inside(1000, 0);
+	EXPECT_EQ(region(), (Box{460, 400, 660, 600}));
+	iet::mouse_down(win(), 560, 500);
+	iet::settle();
+	iet::mouse_move(win(), 580, 500);
+	EXPECT_FALSE(recalculation_requested());
+	iet::mouse_up(win(), 580, 500);
+	iet::settle();
 	EXPECT_EQ(region(), (Box{460, 400, 660, 600}));
 
 	/* The bottom-right corner grows by the finger's movement, but not past

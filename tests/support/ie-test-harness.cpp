@@ -305,6 +305,16 @@ void object_centre(Evas_Object *obj, int *x, int *y)
 	*y = oy + oh / 2;
 }
 
+uint32_t screen_pixel(Evas_Object *win, int x, int y)
+{
+	Ecore_Evas *ee = ecore_evas_ecore_evas_get(canvas_of(win));
+	int w = 0, h = 0;
+	ecore_evas_geometry_get(ee, nullptr, nullptr, &w, &h);
+	auto *pixels = static_cast<const uint32_t *>(ecore_evas_buffer_pixels_get(ee));
+	EXPECT_TRUE(pixels && x >= 0 && y >= 0 && x < w && y < h) << x << "," << y << " on " << w << "x" << h;
+	return pixels && x >= 0 && y >= 0 && x < w && y < h ? pixels[static_cast<size_t>(y) * w + x] : 0;
+}
+
 std::vector<LogLine> log_lines()
 {
 	std::vector<LogLine> lines;

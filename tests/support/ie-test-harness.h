@@ -10,6 +10,7 @@
 #include <Elementary.h>
 #include <gtest/gtest.h>
 
+#include <cstdint>
 #include <functional>
 #include <string>
 #include <vector>
@@ -76,6 +77,10 @@ void key_press(Evas_Object *win, const char *keyname);
 
 /* Centre of an object's geometry. */
 void object_centre(Evas_Object *obj, int *x, int *y);
+
+/* The pixel at (x, y) of the window as drawn now (rendered first):
+ * premultiplied ARGB. */
+uint32_t screen_pixel(Evas_Object *win, int x, int y);
 
 /* Platform log record. */
 struct LogLine {

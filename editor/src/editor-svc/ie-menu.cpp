@@ -1,8 +1,7 @@
 /* What Cancel, Done and the back key do in each view, and the editor's
  * popups (discard changes; not enough memory; could not save; saving). */
 #include <algorithm>
-#include <cstring>
-#include <memory>
+#include <cstdlib>
 
 #include <app_launch.h>
 #include <gadget_window.h>
@@ -169,35 +168,33 @@ void __apply_crop(Viewhandle *vh)
 	const int cw = std::clamp(static_cast<int>((right - left) * kx), 1, iw - x0);
 	const int ch = std::clamp(static_cast<int>((bottom - top) * ky), 1, ih - y0);
 
-	/* Not zero-filled: the crop writes every byte. */
-	const size_t bytes = static_cast<size_t>(cw) * ch * 4;
-	std::unique_ptr<uint8_t, decltype(&free)> cropped(static_cast<uint8_t *>(malloc(bytes)), free);
-	if (!cropped) {
-		IE_LOG_E("Output.pbBuf is null calloc Failed ");
-		return;
-	}
 	auto *pixels = static_cast<uint8_t *>(ie_image_data_get(vh->main_image));
 	if (!pixels) {
 		IE_LOG_E("Image Internal Buffer Get Failed");
 		return;
 	}
+	/* The region goes on screen without another copy: the main image takes
+	 * it over. A picture in the main image's own buffer (loaded reduced or
+	 * turned upright, or cropped before) is cropped where it lies; one
+	 * that Evas holds is copied out once, into memory that is not
+	 * zero-filled first since the crop writes every byte. */
+	const bool in_place = ie_image_pixels_owned(vh->main_image, pixels);
+	uint8_t *cropped = in_place ? pixels : static_cast<uint8_t *>(malloc(static_cast<size_t>(cw) * ch * 4));
+	if (!cropped) {
+		evas_object_image_data_set(img, pixels);
+		IE_LOG_E("Output.pbBuf is null calloc Failed ");
+		return;
+	}
 	IEL_Image source = {static_cast<uint32_t>(iw), static_cast<uint32_t>(ih), IEL_FORMAT_BGRA8888, pixels};
-	IEL_Image region = {static_cast<uint32_t>(cw), static_cast<uint32_t>(ch), IEL_FORMAT_BGRA8888, cropped.get()};
+	IEL_Image region = {static_cast<uint32_t>(cw), static_cast<uint32_t>(ch), IEL_FORMAT_BGRA8888, cropped};
 	if (IEL_Crop_Image(&source, &region, x0, y0) != IEL_OK) {
 		evas_object_image_data_set(img, pixels);
+		if (!in_place)
+			free(cropped);
 		return;
 	}
-
-	evas_object_image_data_set(img, NULL);
-	evas_object_image_size_set(img, cw, ch);
-	void *target = evas_object_image_data_get(img, EINA_TRUE);
-	if (!target) {
-		IE_LOG_E("evas_object_image_data_get Failed ");
+	if (!ie_image_pixels_take(vh->main_image, cropped, cw, ch))
 		return;
-	}
-	memcpy(target, cropped.get(), bytes);
-	evas_object_image_data_set(img, target);
-	evas_object_image_data_update_add(img, 0, 0, cw, ch);
 	vh->edited = EINA_TRUE;
 	vh->cropped = EINA_TRUE;
 }

@@ -160,39 +160,39 @@ static void _image_source_set(Evas_Object *image, const Ie_Image_Source &source)
 	evas_object_image_mmap_set(image, source.file, NULL);
 }
 
-/* Replaces what `image` holds with `pixels` (w x h as stored) turned
- * upright: the turn writes straight into the image's own buffer, so putting
- * the pixels in place costs no more than the copy it replaces. On failure
- * the image is left empty. */
-static bool _image_pixels_put(Evas_Object *image, const void *pixels, int w, int h, int orientation,
+/* Replaces what the image holds with `pixels` (w x h as stored) turned
+ * upright: the turn writes into a buffer the main image then takes over
+ * and shows as it is, so putting the pixels in place costs no more than
+ * the copy it replaces, and a later crop can work within that buffer. On
+ * failure the image is left empty. */
+static bool _image_pixels_put(Mainimg_Smart_Data *sd, const void *pixels, int w, int h, int orientation,
 			      Eina_Bool alpha)
 {
 	int upright_w, upright_h;
 	turned_size(orientation, w, h, &upright_w, &upright_h);
+	Evas_Object *image = sd->image;
 	evas_object_image_file_set(image, NULL, NULL);
 	evas_object_image_alpha_set(image, alpha);
-	evas_object_image_size_set(image, upright_w, upright_h);
-	/* The rest of the editor takes rows as packed. */
-	void *dst = NULL;
-	if (evas_object_image_stride_get(image) == upright_w * 4)
-		dst = evas_object_image_data_get(image, EINA_TRUE);
-	if (!dst) {
+	size_t bytes = 0;
+	std::unique_ptr<uint8_t, Free_Deleter> upright;
+	if (upright_w > 0 && upright_h > 0 &&
+	    !__builtin_mul_overflow((size_t)upright_w * (size_t)upright_h, (size_t)4, &bytes))
+		upright.reset(static_cast<uint8_t *>(malloc(bytes)));
+	if (!upright) {
 		IE_LOG_E("Cannot hold a %dx%d picture", upright_w, upright_h);
 		evas_object_image_data_set(image, NULL);
 		return false;
 	}
 	IEL_Image from = { (uint32_t)w, (uint32_t)h, IEL_FORMAT_BGRA8888,
 			   static_cast<uint8_t *>(const_cast<void *>(pixels)) };
-	IEL_Image to = { 0, 0, IEL_FORMAT_BGRA8888, static_cast<uint8_t *>(dst) };
+	IEL_Image to = { 0, 0, IEL_FORMAT_BGRA8888, upright.get() };
 	int result = IEL_Orient_Image(&from, &to, (unsigned int)orientation);
-	evas_object_image_data_set(image, dst);
 	if (result != IEL_OK) {
 		IE_LOG_E("IEL_Orient_Image failed (%d)", result);
 		evas_object_image_data_set(image, NULL);
 		return false;
 	}
-	evas_object_image_data_update_add(image, 0, 0, upright_w, upright_h);
-	return true;
+	return ie_image_pixels_take(sd->obj, upright.release(), upright_w, upright_h);
 }
 
 /* Upright as stored: the image keeps the file and decodes it in place.
@@ -213,7 +213,7 @@ static bool _load_full_size(Mainimg_Smart_Data *sd, Evas_Object *probe, const Ie
 		const void *pixels = _image_pixels_decode(probe);
 		int sw = 0, sh = 0;
 		evas_object_image_size_get(probe, &sw, &sh);
-		if (!pixels || !_image_pixels_put(sd->image, pixels, sw, sh, plan.orientation,
+		if (!pixels || !_image_pixels_put(sd, pixels, sw, sh, plan.orientation,
 						  evas_object_image_alpha_get(probe)))
 			return false;
 	}
@@ -262,7 +262,7 @@ static bool _load_resampled(Mainimg_Smart_Data *sd, const Ie_Image_Source &sourc
 
 	/* From here the pixels are ours, not the file's: Evas must never reload
 	 * the full-size file over them. */
-	if (!_image_pixels_put(image, buf.get(), stored_w, stored_h, plan.orientation,
+	if (!_image_pixels_put(sd, buf.get(), stored_w, stored_h, plan.orientation,
 			       evas_object_image_alpha_get(image)))
 		return false;
 	sd->img_w = plan.target_w;
@@ -393,7 +393,7 @@ static void _on_image_preloaded(void *data, Evas *e, Evas_Object *preload_image,
 		if (!pixels) {
 			IE_LOG_E("offscreen canvas gave no pixels");
 			failed = true;
-		} else if (!_image_pixels_put(sd->image, pixels, pw, ph, sd->orientation,
+		} else if (!_image_pixels_put(sd, pixels, pw, ph, sd->orientation,
 					      evas_object_image_alpha_get(sd->image))) {
 			failed = true;
 		}
@@ -550,4 +550,53 @@ void *ie_image_data_get(Evas_Object *obj)
 	Mainimg_Smart_Data *sd = _mainimg_data_get(obj);
 	IE_CHECK_NULL(sd);
 	return evas_object_image_data_get(sd->image, EINA_TRUE);
+}
+
+void _own_pixels_release_unshown(Mainimg_Smart_Data *sd)
+{
+	if (!sd->own_pixels || (sd->image && evas_object_image_data_get(sd->image, EINA_FALSE) == sd->own_pixels))
+		return;
+	free(sd->own_pixels);
+	sd->own_pixels = NULL;
+}
+
+/* Evas shows pixels given with evas_object_image_data_set as they are and
+ * never frees them; putting a picture in Evas's own buffer instead costs a
+ * copy into fresh pages, page faults included. */
+Eina_Bool ie_image_pixels_take(Evas_Object *obj, void *pixels, int w, int h)
+{
+	/* Ours from here on, whatever happens. */
+	std::unique_ptr<void, decltype(&free)> taken(pixels, free);
+	IE_CHECK_VAL(obj, EINA_FALSE);
+	IE_CHECK_VAL(pixels, EINA_FALSE);
+	Mainimg_Smart_Data *sd = _mainimg_data_get(obj);
+	IE_CHECK_VAL(sd, EINA_FALSE);
+
+	/* The old picture goes: Evas frees its own pixels, the main image its
+	 * earlier buffer unless it comes back reworked. The field is cleared
+	 * first, as Evas reports the image resized from inside these calls. */
+	Evas_Object *image = sd->image;
+	void *earlier = sd->own_pixels;
+	sd->own_pixels = NULL;
+	evas_object_image_data_set(image, NULL);
+	if (earlier != pixels)
+		free(earlier);
+	evas_object_image_size_set(image, w, h);
+	/* Evas reads the rows at its own stride. */
+	if (w <= 0 || h <= 0 || evas_object_image_stride_get(image) != w * 4) {
+		IE_LOG_E("Cannot show a %dx%d picture", w, h);
+		return EINA_FALSE;
+	}
+	evas_object_image_data_set(image, pixels);
+	evas_object_image_data_update_add(image, 0, 0, w, h);
+	sd->own_pixels = taken.release();
+	return EINA_TRUE;
+}
+
+Eina_Bool ie_image_pixels_owned(Evas_Object *obj, const void *pixels)
+{
+	IE_CHECK_VAL(obj, EINA_FALSE);
+	Mainimg_Smart_Data *sd = _mainimg_data_get(obj);
+	IE_CHECK_VAL(sd, EINA_FALSE);
+	return pixels && pixels == sd->own_pixels;
 }

@@ -38,6 +38,10 @@ typedef struct {
 	/* EXIF orientation of the picture being loaded in the background; its
 	 * pixels are turned upright as they arrive. */
 	int orientation;
+	/* Pixels handed over with ie_image_pixels_take: Evas shows them but
+	 * never frees them, so the main image does, once the picture shows
+	 * other pixels. */
+	void *own_pixels;
 } Mainimg_Smart_Data;
 
 /* The record of a main image object, or NULL for any other object. */
@@ -49,5 +53,9 @@ void _processing_popup_del(Mainimg_Smart_Data *sd);
 /* Drops the offscreen canvas of an asynchronous load and its image; any
  * completion or failure report still pending is cancelled with them. */
 void _preload_release(Mainimg_Smart_Data *sd);
+
+/* Frees the main image's own pixels unless the picture still shows them
+ * (always, once the inner image is gone). */
+void _own_pixels_release_unshown(Mainimg_Smart_Data *sd);
 
 #endif

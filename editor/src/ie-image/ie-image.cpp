@@ -309,6 +309,16 @@ static void _create_event_obj(Mainimg_Smart_Data *sd)
 	evas_object_name_set(gesture, "Slider:Getsture");
 }
 
+/* Another view put a picture of another size in through Evas: the main
+ * image's own buffer, if it had one, is not shown any more. */
+static void _image_resized_cb(void *data, Evas *e, Evas_Object *image, void *event_info)
+{
+	(void)e;
+	(void)image;
+	(void)event_info;
+	_own_pixels_release_unshown(static_cast<Mainimg_Smart_Data *>(data));
+}
+
 static void _mainimg_smart_add(Evas_Object *obj)
 {
 	auto *sd = static_cast<Mainimg_Smart_Data *>(calloc(1, sizeof(Mainimg_Smart_Data)));
@@ -326,6 +336,7 @@ static void _mainimg_smart_add(Evas_Object *obj)
 	evas_object_image_smooth_scale_set(sd->image, EINA_TRUE);
 	evas_object_name_set(sd->image, "mImage");
 	evas_object_smart_member_add(sd->image, obj);
+	evas_object_event_callback_add(sd->image, EVAS_CALLBACK_IMAGE_RESIZE, _image_resized_cb, sd);
 }
 
 static void _mainimg_smart_del(Evas_Object *obj)
@@ -345,9 +356,11 @@ static void _mainimg_smart_del(Evas_Object *obj)
 	_processing_popup_del(sd);
 
 	if (sd->image) {
+		evas_object_event_callback_del_full(sd->image, EVAS_CALLBACK_IMAGE_RESIZE, _image_resized_cb, sd);
 		evas_object_del(sd->image);
 		sd->image = NULL;
 	}
+	_own_pixels_release_unshown(sd);
 	if (sd->gesture) {
 		Evas_Object *gesture = sd->gesture;
 		sd->gesture = NULL;
@@ -541,6 +554,9 @@ void ie_image_size_update(Evas_Object *obj)
 	IE_CHECK(obj);
 	Mainimg_Smart_Data *sd = _mainimg_data_get(obj);
 	IE_CHECK(sd);
+	/* A view that put new pixels of the same size in through Evas comes
+	 * here next. */
+	_own_pixels_release_unshown(sd);
 	evas_object_image_size_get(sd->image, &sd->img_w, &sd->img_h);
 	sd->fitted = EINA_TRUE;
 	evas_object_smart_changed(obj);

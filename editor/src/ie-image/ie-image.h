@@ -25,6 +25,16 @@ enum {
 Evas_Object *ie_image_add(Evas_Object *parent);
 Eina_Bool ie_image_file_load(Evas_Object *obj, const char *path, int width, int height);
 void *ie_image_data_get(Evas_Object *obj);
+/* Shows `pixels` (w x h, rows packed, from malloc) as the picture without
+ * copying them: the main image owns them from then on, also when it
+ * fails (the picture is then left empty), and frees them once the picture
+ * shows other pixels. `pixels` may be the main image's own buffer,
+ * reworked in place. */
+Eina_Bool ie_image_pixels_take(Evas_Object *obj, void *pixels, int w, int h);
+/* Whether `pixels`, as ie_image_data_get gave them, are the buffer the
+ * main image owns: a caller may then rework them in place and hand them
+ * back with ie_image_pixels_take. */
+Eina_Bool ie_image_pixels_owned(Evas_Object *obj, const void *pixels);
 Evas_Object *ie_image_object_get(Evas_Object *obj);
 void ie_image_geometry_get(Evas_Object *obj, Evas_Coord *x, Evas_Coord *y, Evas_Coord *w, Evas_Coord *h);
 void ie_image_zoom_enabled_set(Evas_Object *obj, Eina_Bool enable);

@@ -237,7 +237,7 @@ bool is_edge(int grab)
 
 void _on_mouse_down(void *data, Evas *, Evas_Object *, void *event_info)
 {
-	Selectbox_Smart_Data *sd = _selectbox_data_get(static_cast<Evas_Object *>(data));
+	Selectbox_Smart_Data *sd = _selectbox_own_data(static_cast<Evas_Object *>(data));
 	auto *ev = static_cast<Evas_Event_Mouse_Down *>(event_info);
 	if (!sd || !ev || sd->multi)
 		return;
@@ -246,14 +246,16 @@ void _on_mouse_down(void *data, Evas *, Evas_Object *, void *event_info)
 
 void _on_mouse_up(void *data, Evas *, Evas_Object *, void *)
 {
-	Selectbox_Smart_Data *sd = _selectbox_data_get(static_cast<Evas_Object *>(data));
+	Selectbox_Smart_Data *sd = _selectbox_own_data(static_cast<Evas_Object *>(data));
 	if (sd)
 		sd->grab = GRAB_NONE;
 }
 
+/* A move that leaves the rectangle as it was (a finger still, or pushing
+ * against the picture's edge) asks for no new layout. */
 void _on_mouse_move(void *data, Evas *, Evas_Object *, void *event_info)
 {
-	Selectbox_Smart_Data *sd = _selectbox_data_get(static_cast<Evas_Object *>(data));
+	Selectbox_Smart_Data *sd = _selectbox_own_data(static_cast<Evas_Object *>(data));
 	auto *ev = static_cast<Evas_Event_Mouse_Move *>(event_info);
 	if (!sd || !ev || sd->multi || sd->grab == GRAB_NONE || !sd->image)
 		return;
@@ -261,22 +263,22 @@ void _on_mouse_move(void *data, Evas *, Evas_Object *, void *event_info)
 	const Evas_Coord dx = ev->cur.output.x - ev->prev.output.x;
 	Evas_Coord dy = ev->cur.output.y - ev->prev.output.y;
 	const Allowed_Area area = allowed_area(sd);
+	const Evas_Coord before[4] = {sd->left, sd->top, sd->right, sd->bottom};
 
 	/* A fixed ratio has no edge handles: an edge held moves the box. */
 	if (sd->fixed && is_edge(sd->grab))
 		sd->grab = GRAB_INSIDE;
 	if (sd->grab == GRAB_INSIDE) {
 		translate(sd, area, dx, dy);
-		evas_object_smart_changed(sd->obj);
-		return;
+	} else {
+		const Drag_Limits limits = drag_limits(sd, dx, &dy);
+		if (is_edge(sd->grab))
+			edge_drag(sd, area, dx, dy);
+		else if (!corner_drag(sd, area, limits, dx, dy))
+			return;
 	}
-
-	const Drag_Limits limits = drag_limits(sd, dx, &dy);
-	if (is_edge(sd->grab))
-		edge_drag(sd, area, dx, dy);
-	else if (!corner_drag(sd, area, limits, dx, dy))
-		return;
-	evas_object_smart_changed(sd->obj);
+	if (before[0] != sd->left || before[1] != sd->top || before[2] != sd->right || before[3] != sd->bottom)
+		evas_object_smart_changed(sd->obj);
 }
 
 void _on_mouse_multi_down(void *data, Evas *, Evas_Object *, void *)

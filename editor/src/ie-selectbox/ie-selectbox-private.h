@@ -36,6 +36,12 @@ enum {
 enum { LINE_TOP, LINE_LEFT, LINE_BOTTOM, LINE_RIGHT, LINE_COUNT };
 enum { SHADE_ABOVE, SHADE_RIGHT, SHADE_BELOW, SHADE_LEFT, SHADE_COUNT };
 
+/* The rectangle and the canvas size the members are laid out for. */
+typedef struct {
+	Evas_Coord left, top, right, bottom;
+	Evas_Coord canvas_w, canvas_h;
+} Selectbox_Layout;
+
 typedef struct {
 	Evas_Object *obj;
 	Eina_Bool visible;
@@ -57,10 +63,22 @@ typedef struct {
 	/* Height : width; (0, 0) until a ratio is set, (0, 1) in the free mode. */
 	int ratio_h, ratio_w;
 	Eina_Bool fixed;
+	/* What the members were last laid out for (none yet while `laid_out`
+	 * is clear): a member whose place stays is not touched again. */
+	Selectbox_Layout laid;
+	Eina_Bool laid_out;
 } Selectbox_Smart_Data;
 
 /* The record of a selection box, or NULL for any other object. */
 Selectbox_Smart_Data *_selectbox_data_get(const Evas_Object *obj);
+
+/* The record of an object known to be a selection box: the object of a
+ * smart hook, or the data of a callback the box registered itself. Skips
+ * the class check, which costs more than a finger move's own work. */
+static inline Selectbox_Smart_Data *_selectbox_own_data(const Evas_Object *box)
+{
+	return static_cast<Selectbox_Smart_Data *>(evas_object_smart_data_get(box));
+}
 
 /* The screen's width and height in the window's current orientation. */
 void _selectbox_screen_size_get(int *width, int *height);

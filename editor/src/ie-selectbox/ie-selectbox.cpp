@@ -11,6 +11,7 @@
 #include <algorithm>
 #include <cstdint>
 #include <cstdlib>
+#include <cstring>
 
 #include "ie-config.h"
 #include "ie-debug.h"
@@ -159,48 +160,66 @@ void rotation_remap(Selectbox_Smart_Data *sd)
 	sd->area_bottom = ny + nh;
 }
 
-void layout_members(Selectbox_Smart_Data *sd)
+/* Where every member goes for one layout, by index (LINE_*, HANDLE_*,
+ * SHADE_*). */
+struct Member_Places {
+	Evas_Coord lines[LINE_COUNT][4];
+	Evas_Coord handles[HANDLE_COUNT][2];
+	struct {
+		Evas_Coord x, y, w, h;
+	} shades[SHADE_COUNT];
+};
+
+Member_Places member_places(const Selectbox_Layout &lay)
 {
-	const Evas_Coord l = sd->left, t = sd->top, r = sd->right, b = sd->bottom;
+	const Evas_Coord l = lay.left, t = lay.top, r = lay.right, b = lay.bottom;
 	const Evas_Coord w = r - l, h = b - t;
 	const Evas_Coord hw = w / 2, hh = h / 2;
-
-	evas_object_line_xy_set(sd->lines[LINE_TOP], l, t, r, t);
-	evas_object_line_xy_set(sd->lines[LINE_LEFT], l, t, l, b);
-	evas_object_line_xy_set(sd->lines[LINE_BOTTOM], l, b, r, b);
-	evas_object_line_xy_set(sd->lines[LINE_RIGHT], r, t, r, b);
-
-	const struct {
-		int handle;
-		Evas_Coord x, y;
-	} points[HANDLE_COUNT] = {
-		{HANDLE_TOP_LEFT, l, t},
-		{HANDLE_BOTTOM_RIGHT, r, b},
-		{HANDLE_BOTTOM_LEFT, l, b},
-		{HANDLE_TOP_RIGHT, r, t},
-		{HANDLE_LEFT, l, t + hh},
-		{HANDLE_RIGHT, r, t + hh},
-		{HANDLE_BOTTOM, l + hw, b},
-		{HANDLE_TOP, l + hw, t},
+	Member_Places p = {
+		{{l, t, r, t}, {l, t, l, b}, {l, b, r, b}, {r, t, r, b}},
+		{},
+		{{0, 0, lay.canvas_w, t}, {r, t, lay.canvas_w - r, h}, {0, b, lay.canvas_w, lay.canvas_h - b}, {0, t, l, h}},
 	};
-	for (const auto &p : points)
-		evas_object_move(sd->handles[p.handle], p.x - HANDLE_HALF, p.y - HANDLE_HALF);
+	const Evas_Coord points[HANDLE_COUNT][2] = {
+		{l, t}, {r, b}, {l, b}, {r, t}, {l, t + hh}, {r, t + hh}, {l + hw, b}, {l + hw, t},
+	};
+	for (int i = 0; i < HANDLE_COUNT; i++) {
+		p.handles[i][0] = points[i][0] - HANDLE_HALF;
+		p.handles[i][1] = points[i][1] - HANDLE_HALF;
+	}
+	return p;
+}
 
+/* A finger moving one corner or edge moves only some of the members, and
+ * each Evas geometry call costs over a thousand instructions: the members
+ * that stay where they are are left alone. */
+void layout_members(Selectbox_Smart_Data *sd)
+{
 	/* The bands reach the canvas edges, whatever the box's own size. */
-	Evas_Coord ow = 0, oh = 0;
-	evas_output_size_get(evas_object_evas_get(sd->obj), &ow, &oh);
-	const struct {
-		int shade;
-		Evas_Coord x, y, w, h;
-	} bands[SHADE_COUNT] = {
-		{SHADE_ABOVE, 0, 0, ow, t},
-		{SHADE_RIGHT, r, t, ow - r, h},
-		{SHADE_BELOW, 0, b, ow, oh - b},
-		{SHADE_LEFT, 0, t, l, h},
-	};
-	for (const auto &band : bands) {
-		evas_object_resize(sd->shades[band.shade], band.w, band.h);
-		evas_object_move(sd->shades[band.shade], band.x, band.y);
+	Selectbox_Layout lay = {sd->left, sd->top, sd->right, sd->bottom, 0, 0};
+	evas_output_size_get(evas_object_evas_get(sd->obj), &lay.canvas_w, &lay.canvas_h);
+	const bool all = !sd->laid_out;
+	const Member_Places to = member_places(lay);
+	const Member_Places from = all ? to : member_places(sd->laid);
+	sd->laid = lay;
+	sd->laid_out = EINA_TRUE;
+
+	for (int i = 0; i < LINE_COUNT; i++) {
+		const Evas_Coord *e = to.lines[i];
+		if (all || memcmp(e, from.lines[i], sizeof(to.lines[i])) != 0)
+			evas_object_line_xy_set(sd->lines[i], e[0], e[1], e[2], e[3]);
+	}
+	for (int i = 0; i < HANDLE_COUNT; i++) {
+		const Evas_Coord *p = to.handles[i];
+		if (all || p[0] != from.handles[i][0] || p[1] != from.handles[i][1])
+			evas_object_move(sd->handles[i], p[0], p[1]);
+	}
+	for (int i = 0; i < SHADE_COUNT; i++) {
+		const auto &band = to.shades[i], &was = from.shades[i];
+		if (all || band.w != was.w || band.h != was.h)
+			evas_object_resize(sd->shades[i], band.w, band.h);
+		if (all || band.x != was.x || band.y != was.y)
+			evas_object_move(sd->shades[i], band.x, band.y);
 	}
 }
 
@@ -456,7 +475,7 @@ static void _selectbox_smart_color_set(Evas_Object *obj, int r, int g, int b, in
 
 static void _selectbox_smart_calculate(Evas_Object *obj)
 {
-	Selectbox_Smart_Data *sd = _selectbox_data_get(obj);
+	Selectbox_Smart_Data *sd = _selectbox_own_data(obj);
 	if (!sd || !sd->image)
 		return;
 	if (sd->rotate_pending)
