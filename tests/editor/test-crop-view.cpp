@@ -335,6 +335,7 @@ TEST_F(CropView, ASecondCropCutsTheCroppedPictureWhereItLies)
 	}
 
 	tap_button(vh->done_btn);
+	ASSERT_TRUE(wait_for_close());
 	ASSERT_EQ(close_requests.size(), 1u);
 	Evas_Object *check = evas_object_image_add(evas());
 	evas_object_image_file_set(check, close_requests[0].c_str(), nullptr);
