@@ -32,6 +32,9 @@ Bytes jpeg_with_segments(const Bytes &jpeg, const std::vector<Bytes> &segments, 
 bool write_oriented_jpeg(const std::string &path, int w, int h, int orientation, bool big_endian,
 			 bool comment_first);
 
+/* write_picture's w x h picture as a progressive JPEG (quality 95). */
+bool write_progressive_jpeg(const std::string &path, int w, int h);
+
 /* write_picture's PNG with only the first half of its compressed image
  * data, in chunks that are whole and correct: nothing shows the damage
  * before the data is decoded. */

@@ -38,6 +38,10 @@ typedef struct {
 	/* EXIF orientation of the picture being loaded in the background; its
 	 * pixels are turned upright as they arrive. */
 	int orientation;
+	/* A JPEG or PNG decoded by our own decoder on a worker thread: the
+	 * thread and its job, until the result is put in place or dropped. */
+	Ecore_Thread *decode_thread;
+	struct Decode_Job *decode_job;
 } Mainimg_Smart_Data;
 
 /* The record of a main image object, or NULL for any other object. */
@@ -46,8 +50,9 @@ Mainimg_Smart_Data *_mainimg_data_get(const Evas_Object *obj);
 /* Takes down the processing popup, if one is up. */
 void _processing_popup_del(Mainimg_Smart_Data *sd);
 
-/* Drops the offscreen canvas of an asynchronous load and its image; any
- * completion or failure report still pending is cancelled with them. */
+/* Drops the offscreen canvas of an asynchronous load and its image, or the
+ * worker's decoding; any completion or failure report still pending is
+ * cancelled with them. */
 void _preload_release(Mainimg_Smart_Data *sd);
 
 #endif
