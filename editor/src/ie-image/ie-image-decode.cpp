@@ -14,6 +14,7 @@
 #include <png.h>
 
 #include "ie-engine.h"
+#include "ie-image-progressive.h"
 
 namespace {
 
@@ -49,6 +50,10 @@ struct Decode_Work {
 	}
 	uint8_t *strip_row(int i) const { return strip + size_t(width) * 4 * size_t(i); }
 	void push(int rows) const { IEL_Reducer_Push(reducer, strip, uint32_t(rows)); }
+	static void push_rows(void *data, const uint8_t *rows, int count)
+	{
+		IEL_Reducer_Push(static_cast<Decode_Work *>(data)->reducer, rows, uint32_t(count));
+	}
 	void finish()
 	{
 		IEL_Reducer_Destroy(reducer);
@@ -114,6 +119,47 @@ bool jpeg_probe(const uint8_t *data, size_t size, int *w, int *h)
 	return ours;
 }
 
+/* A progressive JPEG through our own decoder, at the smallest scale that
+ * covers the target; NOT_OURS hands it back to libjpeg. */
+enum class Progressive_Result { DONE, FAILED, CANCELLED, NOT_OURS };
+
+Progressive_Result progressive_decode(Decode_Work *work, const uint8_t *data, size_t size, int target_w,
+				      int target_h, Ie_Decode_Stop stop, void *stop_data)
+{
+	Ie_Progressive picture;
+	Progressive_Result result = Progressive_Result::NOT_OURS;
+	int w = 0, h = 0;
+	switch (ie_progressive_read(data, size, target_w, target_h, stop, stop_data, &picture)) {
+	case Ie_Progressive_Status::CANCELLED:
+		result = Progressive_Result::CANCELLED;
+		break;
+	case Ie_Progressive_Status::NOT_OURS:
+		break;
+	case Ie_Progressive_Status::DONE:
+		/* Full size with subsampled chroma needs upsampling: libjpeg's. */
+		if (!ie_progressive_scale_ok(picture, &w, &h) || w < target_w || h < target_h)
+			break;
+		if (!work->start(uint32_t(w), uint32_t(h), target_w, target_h)) {
+			result = Progressive_Result::FAILED;
+			break;
+		}
+		switch (ie_progressive_render(picture, Decode_Work::push_rows, work, stop, stop_data)) {
+		case Ie_Decode_Status::DONE:
+			result = Progressive_Result::DONE;
+			break;
+		case Ie_Decode_Status::CANCELLED:
+			result = Progressive_Result::CANCELLED;
+			break;
+		case Ie_Decode_Status::FAILED:
+			result = Progressive_Result::FAILED;
+			break;
+		}
+		break;
+	}
+	ie_progressive_free(&picture);
+	return result;
+}
+
 Ie_Decode_Status jpeg_decode(Jpeg_Decode *d, const uint8_t *data, size_t size, int target_w, int target_h,
 			     Ie_Decode_Stop stop, void *stop_data, Ie_Decoded *out)
 {
@@ -124,6 +170,24 @@ Ie_Decode_Status jpeg_decode(Jpeg_Decode *d, const uint8_t *data, size_t size, i
 	jpeg_read_header(&d->cinfo, TRUE);
 	if (!jpeg_ours(d->cinfo))
 		goto done;
+	if (d->cinfo.progressive_mode &&
+	    (d->cinfo.jpeg_color_space == JCS_YCbCr || d->cinfo.jpeg_color_space == JCS_GRAYSCALE)) {
+		switch (progressive_decode(&d->work, data, size, target_w, target_h, stop, stop_data)) {
+		case Progressive_Result::DONE:
+			*out = { d->work.pixels, target_w, target_h, false };
+			d->work.pixels = nullptr;
+			status = Ie_Decode_Status::DONE;
+			goto done;
+		case Progressive_Result::CANCELLED:
+			status = Ie_Decode_Status::CANCELLED;
+			goto done;
+		case Progressive_Result::FAILED:
+			goto done;
+		case Progressive_Result::NOT_OURS:
+			d->work.finish();
+			break;
+		}
+	}
 	d->cinfo.out_color_space = JCS_EXT_BGRA;
 	d->cinfo.dct_method = JDCT_ISLOW;
 	d->cinfo.scale_denom = JPEG_SCALE_DENOM;
