@@ -3,11 +3,15 @@
  * common sampling, scan scripts with and without successive approximation,
  * restart intervals, and each scale, on the processor's bit operations and
  * on the portable ones; its pixels are libjpeg's scaled decoding within
- * the rounding of a different inverse DCT; anything it does not take is
- * handed back. */
+ * the rounding of a different inverse DCT. PNG: the rows are libpng's, byte
+ * for byte, for every colour kind, filter and split of the image data; the
+ * unfilter's fast path is its reference's. Anything either does not take
+ * is handed back. */
 #include <gtest/gtest.h>
 
 #include <jpeglib.h>
+#include <png.h>
+#include <isa-l/crc.h>
 
 #include <cmath>
 #include <cstdio>
@@ -17,6 +21,7 @@
 #include <vector>
 
 #include "ie-image-decode.h"
+#include "ie-image-png.h"
 #include "ie-image-progressive.h"
 
 namespace {
@@ -319,6 +324,211 @@ TEST(ProgressiveJpeg, HandsBackWhatItDoesNotTake)
 	cut.insert(cut.end(), { 0xFF, 0xD9 });
 	EXPECT_EQ(read_progressive(cut, w, h, false, &p), Ie_Progressive_Status::NOT_OURS);
 	ie_progressive_free(&p);
+}
+
+/* ---- PNG ---- */
+
+struct Png_Options {
+	int colour = PNG_COLOR_TYPE_RGB;
+	int depth = 8;
+	int filters = PNG_ALL_FILTERS;
+	bool interlace = false;
+	bool transparent_colour = false;
+	size_t idat_size = 8192; /* image data split into chunks of this */
+};
+
+/* `pixels`: as many bytes a sample as the depth needs, samples as the
+ * colour kind has them. */
+Bytes write_png(const Bytes &pixels, int w, int h, const Png_Options &o)
+{
+	Bytes file;
+	png_structp png = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, nullptr, nullptr);
+	png_infop info = png_create_info_struct(png);
+	png_set_write_fn(png, &file,
+			 [](png_structp p, png_bytep data, png_size_t n) {
+				 auto *out = static_cast<Bytes *>(png_get_io_ptr(p));
+				 out->insert(out->end(), data, data + n);
+			 },
+			 nullptr);
+	png_set_compression_buffer_size(png, o.idat_size);
+	png_set_IHDR(png, info, png_uint_32(w), png_uint_32(h), o.depth, o.colour,
+		     o.interlace ? PNG_INTERLACE_ADAM7 : PNG_INTERLACE_NONE, PNG_COMPRESSION_TYPE_DEFAULT,
+		     PNG_FILTER_TYPE_DEFAULT);
+	png_set_filter(png, 0, o.filters);
+	png_color palette[2] = { { 10, 20, 30 }, { 200, 100, 50 } };
+	if (o.colour == PNG_COLOR_TYPE_PALETTE)
+		png_set_PLTE(png, info, palette, 2);
+	png_color_16 transparent = {};
+	if (o.transparent_colour)
+		png_set_tRNS(png, info, nullptr, 0, &transparent);
+	png_write_info(png, info);
+	const int channels = png_get_channels(png, info);
+	const size_t row = size_t(w) * channels * (o.depth / 8 ? o.depth / 8 : 1);
+	const int passes = png_set_interlace_handling(png);
+	for (int pass = 0; pass < passes; pass++)
+		for (int y = 0; y < h; y++)
+			png_write_row(png, const_cast<png_bytep>(&pixels[size_t(y) * row]));
+	png_write_end(png, info);
+	png_destroy_write_struct(&png, &info);
+	return file;
+}
+
+/* libpng's rows with the loader's transforms, premultiplied as the loader
+ * does: the reference for ours. */
+Bytes libpng_rows(const Bytes &file, int *w, int *h)
+{
+	struct Reader {
+		const Bytes *file;
+		size_t pos;
+	} reader{ &file, 0 };
+	png_structp png = png_create_read_struct(PNG_LIBPNG_VER_STRING, nullptr, nullptr, nullptr);
+	png_infop info = png_create_info_struct(png);
+	png_set_read_fn(png, &reader, [](png_structp p, png_bytep to, png_size_t n) {
+		auto *r = static_cast<Reader *>(png_get_io_ptr(p));
+		memcpy(to, r->file->data() + r->pos, n);
+		r->pos += n;
+	});
+	png_read_info(png, info);
+	*w = int(png_get_image_width(png, info));
+	*h = int(png_get_image_height(png, info));
+	const int colour = png_get_color_type(png, info);
+	const bool alpha = colour & PNG_COLOR_MASK_ALPHA;
+	if (!(colour & PNG_COLOR_MASK_COLOR))
+		png_set_gray_to_rgb(png);
+	png_set_bgr(png);
+	if (!alpha)
+		png_set_filler(png, 0xFF, PNG_FILLER_AFTER);
+	png_read_update_info(png, info);
+	Bytes pixels(size_t(*w) * *h * 4);
+	for (int y = 0; y < *h; y++)
+		png_read_row(png, &pixels[size_t(y) * *w * 4], nullptr);
+	png_destroy_read_struct(&png, &info, nullptr);
+	for (size_t i = 0; alpha && i < pixels.size(); i += 4)
+		for (int c = 0; c < 3; c++)
+			pixels[i + c] = uint8_t((pixels[i + c] * (pixels[i + 3] + 1u)) >> 8);
+	return pixels;
+}
+
+struct Png_Sink {
+	Bytes pixels;
+	int w;
+};
+
+Ie_Png_Status our_png_rows(const Bytes &file, Png_Sink *sink)
+{
+	return ie_png_decode(
+		file.data(), file.size(),
+		[](void *data, const uint8_t *rows, int count) {
+			auto *s = static_cast<Png_Sink *>(data);
+			s->pixels.insert(s->pixels.end(), rows, rows + size_t(count) * s->w * 4);
+		},
+		sink, nullptr, nullptr);
+}
+
+TEST(PngUnfilter, FastPathIsTheReference)
+{
+	std::mt19937 rng(3);
+	for (int bpp = 1; bpp <= 4; bpp++)
+		for (int type = 0; type <= 4; type++)
+			for (size_t pixels = 1; pixels <= 40; pixels++)
+				for (bool first_row : { false, true }) {
+					const size_t length = pixels * size_t(bpp);
+					Bytes prior(length), row(length + 16, 0xA5);
+					for (uint8_t &b : prior)
+						b = uint8_t(rng());
+					for (size_t i = 0; i < length; i++)
+						row[i] = uint8_t(rng());
+					Bytes want = row, got = row;
+					const uint8_t *above = first_row ? nullptr : prior.data();
+					ASSERT_TRUE(ie_png_unfilter_reference(type, want.data(), above, length, bpp));
+					ASSERT_TRUE(ie_png_unfilter(type, got.data(), above, length, bpp));
+					ASSERT_EQ(got, want) << "bpp " << bpp << " filter " << type << " pixels " << pixels
+							     << (first_row ? " first row" : "");
+				}
+	Bytes row(8);
+	EXPECT_FALSE(ie_png_unfilter(5, row.data(), nullptr, row.size(), 4));
+	EXPECT_FALSE(ie_png_unfilter_reference(5, row.data(), nullptr, row.size(), 4));
+}
+
+TEST(PngDecode, RowsAreLibpngsForEveryKindFilterAndSplit)
+{
+	const int colours[] = { PNG_COLOR_TYPE_GRAY, PNG_COLOR_TYPE_GRAY_ALPHA, PNG_COLOR_TYPE_RGB, PNG_COLOR_TYPE_RGB_ALPHA };
+	const int filters[] = { PNG_FILTER_NONE, PNG_FILTER_SUB, PNG_FILTER_UP, PNG_FILTER_AVG, PNG_FILTER_PAETH, PNG_ALL_FILTERS };
+	const std::pair<int, int> sizes[] = { { 1, 1 }, { 5, 3 }, { 33, 17 }, { 70, 41 } };
+	for (int colour : colours)
+		for (int filter : filters)
+			for (const auto &size : sizes) {
+				Png_Options o;
+				o.colour = colour;
+				o.filters = filter;
+				o.idat_size = size.first == 70 ? 64 : 8192;
+				const int channels = colour == PNG_COLOR_TYPE_GRAY ? 1 : colour == PNG_COLOR_TYPE_GRAY_ALPHA ? 2 : colour == PNG_COLOR_TYPE_RGB ? 3 : 4;
+				const Bytes file = write_png(test_pixels(size.first, size.second, channels, uint32_t(size.first + colour), 20),
+							     size.first, size.second, o);
+				const std::string at = "colour " + std::to_string(colour) + " filter " + std::to_string(filter) + " " +
+						       std::to_string(size.first) + "x" + std::to_string(size.second);
+				int w = 0, h = 0;
+				bool alpha = false;
+				ASSERT_TRUE(ie_png_probe(file.data(), file.size(), &w, &h, &alpha)) << at;
+				EXPECT_EQ(alpha, bool(colour & PNG_COLOR_MASK_ALPHA)) << at;
+				Png_Sink sink{ {}, w };
+				ASSERT_EQ(our_png_rows(file, &sink), Ie_Png_Status::DONE) << at;
+				int lw = 0, lh = 0;
+				EXPECT_TRUE(sink.pixels == libpng_rows(file, &lw, &lh)) << at;
+			}
+}
+
+/* Palette, 16 bits, interlacing and a transparent colour are libpng's;
+ * a wrong CRC, damaged or short image data are refused, for libpng to
+ * decide on. */
+TEST(PngDecode, HandsBackWhatItDoesNotTake)
+{
+	const int w = 24, h = 10;
+	auto refused = [](const Bytes &file) {
+		int pw, ph;
+		bool alpha;
+		Png_Sink sink{ {}, 24 };
+		return !ie_png_probe(file.data(), file.size(), &pw, &ph, &alpha) || our_png_rows(file, &sink) == Ie_Png_Status::NOT_OURS;
+	};
+	Png_Options palette;
+	palette.colour = PNG_COLOR_TYPE_PALETTE;
+	Bytes indices(size_t(w) * h);
+	for (size_t i = 0; i < indices.size(); i++)
+		indices[i] = uint8_t(i % 2);
+	EXPECT_TRUE(refused(write_png(indices, w, h, palette)));
+	Png_Options deep;
+	deep.depth = 16;
+	EXPECT_TRUE(refused(write_png(test_pixels(w * 2, h, 3, 1, 5), w, h, deep)));
+	Png_Options interlaced;
+	interlaced.interlace = true;
+	EXPECT_TRUE(refused(write_png(test_pixels(w, h, 3, 1, 5), w, h, interlaced)));
+	Png_Options transparent;
+	transparent.transparent_colour = true;
+	EXPECT_TRUE(refused(write_png(test_pixels(w, h, 3, 1, 5), w, h, transparent)));
+
+	const Bytes good = write_png(test_pixels(w, h, 3, 1, 5), w, h, Png_Options());
+	ASSERT_FALSE(refused(good));
+	/* The first IDAT: its length, type and data. */
+	size_t idat = 8;
+	while (memcmp(&good[idat + 4], "IDAT", 4) != 0)
+		idat += 12 + (size_t(good[idat]) << 24 | good[idat + 1] << 16 | good[idat + 2] << 8 | good[idat + 3]);
+	const size_t length = size_t(good[idat + 2]) << 8 | good[idat + 3];
+	Bytes bad_crc = good;
+	bad_crc[idat + 8 + length / 2] ^= 0x10;
+	EXPECT_TRUE(refused(bad_crc));
+	/* Damaged and short data, with the CRC made right again. */
+	auto recrc = [&](Bytes file) {
+		const uint32_t crc = crc32_gzip_refl(0, &file[idat + 4], length + 4);
+		for (int i = 0; i < 4; i++)
+			file[idat + 8 + length + i] = uint8_t(crc >> (24 - 8 * i));
+		return file;
+	};
+	Bytes damaged = bad_crc;
+	EXPECT_TRUE(refused(recrc(damaged)));
+	Bytes short_data = good;
+	for (size_t i = length / 2; i < length; i++)
+		short_data[idat + 8 + i] = 0;
+	EXPECT_TRUE(refused(recrc(short_data)));
 }
 
 } // namespace

@@ -14,6 +14,7 @@
 #include <png.h>
 
 #include "ie-engine.h"
+#include "ie-image-png.h"
 #include "ie-image-progressive.h"
 
 namespace {
@@ -312,6 +313,29 @@ void premultiply(uint8_t *row, size_t pixels)
 Ie_Decode_Status png_decode(Png_Decode *d, const uint8_t *data, size_t size, int target_w, int target_h,
 			    Ie_Decode_Stop stop, void *stop_data, Ie_Decoded *out)
 {
+	/* The common kinds through our own decoding; libpng for the rest, and
+	 * for anything ours finds amiss. */
+	int w = 0, h = 0;
+	bool has_alpha = false;
+	if (ie_png_probe(data, size, &w, &h, &has_alpha)) {
+		if (!d->work.start(uint32_t(w), uint32_t(h), target_w, target_h)) {
+			d->work.finish();
+			return Ie_Decode_Status::FAILED;
+		}
+		switch (ie_png_decode(data, size, Decode_Work::push_rows, &d->work, stop, stop_data)) {
+		case Ie_Png_Status::DONE:
+			*out = { d->work.pixels, target_w, target_h, has_alpha };
+			d->work.pixels = nullptr;
+			d->work.finish();
+			return Ie_Decode_Status::DONE;
+		case Ie_Png_Status::CANCELLED:
+			d->work.finish();
+			return Ie_Decode_Status::CANCELLED;
+		case Ie_Png_Status::NOT_OURS:
+			d->work.finish();
+			break;
+		}
+	}
 	Ie_Decode_Status status = Ie_Decode_Status::FAILED;
 	if (!png_prepare(d, data, size) || setjmp(png_jmpbuf(d->png)))
 		goto done;
