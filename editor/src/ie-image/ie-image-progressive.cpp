@@ -11,6 +11,8 @@
  * correction bits of the others in bulk. */
 #include "ie-image-progressive.h"
 
+#include <emmintrin.h>
+
 #include <cmath>
 #include <cstdlib>
 #include <cstring>
@@ -519,6 +521,52 @@ const uint8_t *segment_end(const uint8_t *p, const uint8_t *end)
 	return end;
 }
 
+enum Scan_Kind { INTERLEAVED_DC, DC_FIRST, DC_REFINE, AC_FIRST, AC_REFINE };
+
+/* `count` units of one kind of scan, left to right and rows top down from
+ * (*ux, *uy). A loop of its own, with the bit reader in registers: the
+ * refinement loop is most of the decoding. */
+template <Bit_Ops Ops, Scan_Kind Kind>
+__attribute__((noinline)) bool decode_units(Decoder &d, const Scan &s, Bits &bits_io, long count, int units_x, int *ux,
+					     int *uy)
+{
+	Bits bits = bits_io;
+	int x = *ux, y = *uy;
+	const int c0 = s.comp[0];
+	bool ok = true;
+	for (long i = 0; i < count && ok; i++) {
+		if constexpr (Kind == INTERLEAVED_DC) {
+			for (int c = 0; c < s.count && ok; c++) {
+				const Ie_Progressive_Plane &plane = d.out->planes[s.comp[c]];
+				for (int by = 0; by < plane.v && ok; by++)
+					for (int bx = 0; bx < plane.h && ok; bx++) {
+						const Block block = block_of(d, s.comp[c], x * plane.h + bx, y * plane.v + by);
+						if (s.ah)
+							decode_dc_refine<Ops>(bits, s, block);
+						else
+							ok = decode_dc_first<Ops>(d, bits, s, c, block);
+					}
+			}
+		} else if constexpr (Kind == DC_FIRST) {
+			ok = decode_dc_first<Ops>(d, bits, s, 0, block_of(d, c0, x, y));
+		} else if constexpr (Kind == DC_REFINE) {
+			decode_dc_refine<Ops>(bits, s, block_of(d, c0, x, y));
+		} else if constexpr (Kind == AC_FIRST) {
+			ok = decode_ac_first<Ops>(d, bits, s, block_of(d, c0, x, y));
+		} else {
+			ok = decode_ac_refine<Ops>(d, bits, s, block_of(d, c0, x, y));
+		}
+		if (++x == units_x) {
+			x = 0;
+			y++;
+		}
+	}
+	bits_io = bits;
+	*ux = x;
+	*uy = y;
+	return ok;
+}
+
 template <Bit_Ops Ops> Status decode_scan(Decoder &d, const Scan &s, const uint8_t *&pos, const uint8_t *end)
 {
 	Ie_Progressive &img = *d.out;
@@ -541,47 +589,19 @@ template <Bit_Ops Ops> Status decode_scan(Decoder &d, const Scan &s, const uint8
 		const uint8_t *seg_end = segment_end(pos, end);
 		Bits bits(pos, seg_end);
 		const long stop = std::min(units, unit + interval);
-		/* Units left to right, rows top down, each kind of scan in a loop
-		 * of its own. */
-		auto walk = [&](auto decode_unit) {
-			for (; unit < stop; unit++) {
-				if (!decode_unit(ux, uy))
-					return false;
-				if (++ux == units_x) {
-					ux = 0;
-					uy++;
-				}
-			}
-			return true;
-		};
-		const int c0 = s.comp[0];
 		bool ok;
+		const long count = stop - unit;
 		if (s.count > 1)
-			ok = walk([&](int x, int y) {
-				for (int c = 0; c < s.count; c++) {
-					const Ie_Progressive_Plane &plane = img.planes[s.comp[c]];
-					for (int by = 0; by < plane.v; by++)
-						for (int bx = 0; bx < plane.h; bx++) {
-							const Block block = block_of(d, s.comp[c], x * plane.h + bx, y * plane.v + by);
-							if (!first)
-								decode_dc_refine<Ops>(bits, s, block);
-							else if (!decode_dc_first<Ops>(d, bits, s, c, block))
-								return false;
-						}
-				}
-				return true;
-			});
+			ok = decode_units<Ops, INTERLEAVED_DC>(d, s, bits, count, units_x, &ux, &uy);
 		else if (dc && first)
-			ok = walk([&](int x, int y) { return decode_dc_first<Ops>(d, bits, s, 0, block_of(d, c0, x, y)); });
+			ok = decode_units<Ops, DC_FIRST>(d, s, bits, count, units_x, &ux, &uy);
 		else if (dc)
-			ok = walk([&](int x, int y) {
-				decode_dc_refine<Ops>(bits, s, block_of(d, c0, x, y));
-				return true;
-			});
+			ok = decode_units<Ops, DC_REFINE>(d, s, bits, count, units_x, &ux, &uy);
 		else if (first)
-			ok = walk([&](int x, int y) { return decode_ac_first<Ops>(d, bits, s, block_of(d, c0, x, y)); });
+			ok = decode_units<Ops, AC_FIRST>(d, s, bits, count, units_x, &ux, &uy);
 		else
-			ok = walk([&](int x, int y) { return decode_ac_refine<Ops>(d, bits, s, block_of(d, c0, x, y)); });
+			ok = decode_units<Ops, AC_REFINE>(d, s, bits, count, units_x, &ux, &uy);
+		unit = stop;
 		if (!ok)
 			return Status::NOT_OURS;
 		if (bits.overrun())
@@ -812,35 +832,101 @@ const Idct_Basis &basis(int n)
 	return n == 1 ? b1 : n == 2 ? b2 : n == 4 ? b4 : b8;
 }
 
-uint8_t NATURAL_TO_ZIGZAG[64];
-const bool natural_to_zigzag_built = [] {
-	for (int k = 0; k < 64; k++)
-		NATURAL_TO_ZIGZAG[NATURAL_ORDER[k]] = uint8_t(k);
-	return true;
-}();
+struct Zigzag_Index {
+	uint8_t of[64];
+	constexpr Zigzag_Index() : of()
+	{
+		for (int k = 0; k < 64; k++)
+			of[NATURAL_ORDER[k]] = uint8_t(k);
+	}
+};
+constexpr Zigzag_Index ZIGZAG_INDEX;
 
-/* One block to nx x ny samples into `out` (rows `stride` apart). */
-void idct_block(const int16_t *coef, const uint16_t *quant, int nx, int ny, uint8_t *out, size_t stride)
+/* One block to NX x NY samples into `out` (rows `stride` apart), rounded
+ * half up and clamped; sizes fixed so that the loops unroll. */
+template <int NX, int NY>
+void idct_block(const int16_t *coef, const uint16_t *quant, const Idct_Basis &bx, const Idct_Basis &by, uint8_t *out,
+		size_t stride)
 {
-	const Idct_Basis &bx = basis(nx), &by = basis(ny);
-	float rows[8][8]; /* [v][x] */
-	for (int v = 0; v < ny; v++)
-		for (int x = 0; x < nx; x++) {
+	float rows[NY][NX]; /* [v][x] */
+	for (int v = 0; v < NY; v++) {
+		float f[NX];
+		for (int u = 0; u < NX; u++) {
+			const int z = ZIGZAG_INDEX.of[v * 8 + u];
+			f[u] = float(coef[z] * quant[z]);
+		}
+		for (int x = 0; x < NX; x++) {
 			float sum = 0;
-			for (int u = 0; u < nx; u++) {
-				const int z = NATURAL_TO_ZIGZAG[v * 8 + u];
-				sum += bx.m[x][u] * float(coef[z] * quant[z]);
-			}
+			for (int u = 0; u < NX; u++)
+				sum += bx.m[x][u] * f[u];
 			rows[v][x] = sum;
 		}
-	for (int y = 0; y < ny; y++)
-		for (int x = 0; x < nx; x++) {
+	}
+	for (int y = 0; y < NY; y++)
+		for (int x = 0; x < NX; x++) {
 			float sum = 128.0f;
-			for (int v = 0; v < ny; v++)
+			for (int v = 0; v < NY; v++)
 				sum += by.m[y][v] * rows[v][x];
-			const int value = int(std::floor(sum + 0.5f));
-			out[size_t(y) * stride + size_t(x)] = uint8_t(value < 0 ? 0 : value > 255 ? 255 : value);
+			/* floor(sum + 0.5), clamped: below zero it is 0 either way. */
+			out[size_t(y) * stride + size_t(x)] = uint8_t(sum <= 0 ? 0 : sum >= 255 ? 255 : int(sum + 0.5f));
 		}
+}
+
+/* Four or eight samples wide: whole rows in vectors (SSE2, which every
+ * x86-64 has). */
+template <int NX, int NY>
+void idct_block_vector(const int16_t *coef, const uint16_t *quant, const Idct_Basis &bx, const Idct_Basis &by,
+		       uint8_t *out, size_t stride)
+{
+	constexpr int LANES = NX / 4;
+	/* Column u of the row basis, as vectors over x. */
+	__m128 basis_column[NX][LANES];
+	for (int u = 0; u < NX; u++)
+		for (int l = 0; l < LANES; l++)
+			basis_column[u][l] = _mm_setr_ps(bx.m[4 * l][u], bx.m[4 * l + 1][u], bx.m[4 * l + 2][u], bx.m[4 * l + 3][u]);
+	__m128 rows[NY][LANES];
+	for (int v = 0; v < NY; v++)
+		for (int l = 0; l < LANES; l++) {
+			__m128 sum = _mm_setzero_ps();
+			for (int u = 0; u < NX; u++) {
+				const int z = ZIGZAG_INDEX.of[v * 8 + u];
+				sum = _mm_add_ps(sum, _mm_mul_ps(basis_column[u][l], _mm_set1_ps(float(coef[z] * quant[z]))));
+			}
+			rows[v][l] = sum;
+		}
+	const __m128 half = _mm_set1_ps(0.5f), zero = _mm_setzero_ps(), top = _mm_set1_ps(255.0f);
+	for (int y = 0; y < NY; y++)
+		for (int l = 0; l < LANES; l++) {
+			__m128 sum = _mm_set1_ps(128.0f);
+			for (int v = 0; v < NY; v++)
+				sum = _mm_add_ps(sum, _mm_mul_ps(_mm_set1_ps(by.m[y][v]), rows[v][l]));
+			/* floor(sum + 0.5), clamped, as the narrow blocks round. */
+			const __m128i value = _mm_cvttps_epi32(_mm_min_ps(_mm_max_ps(_mm_add_ps(sum, half), zero), top));
+			const __m128i words = _mm_packs_epi32(value, value);
+			const int packed = _mm_cvtsi128_si32(_mm_packus_epi16(words, words));
+			memcpy(out + size_t(y) * stride + size_t(4 * l), &packed, 4);
+		}
+}
+
+using Idct_Row = void (*)(const int16_t *, const uint16_t *, const Idct_Basis &, const Idct_Basis &, uint8_t *, size_t);
+
+template <int NX, int NY> constexpr Idct_Row idct_of()
+{
+	if constexpr (NX >= 4)
+		return idct_block_vector<NX, NY>;
+	else
+		return idct_block<NX, NY>;
+}
+
+template <int NX> Idct_Row idct_for_height(int ny)
+{
+	return ny == 1 ? idct_of<NX, 1>() : ny == 2 ? idct_of<NX, 2>() : ny == 4 ? idct_of<NX, 4>() : idct_of<NX, 8>();
+}
+
+Idct_Row idct_for(int nx, int ny)
+{
+	return nx == 1 ? idct_for_height<1>(ny) : nx == 2 ? idct_for_height<2>(ny) : nx == 4 ? idct_for_height<4>(ny)
+											   : idct_for_height<8>(ny);
 }
 
 /* YCbCr to BGRA in 16-bit fixed point, the JFIF equations. */
@@ -989,10 +1075,12 @@ Ie_Decode_Status ie_progressive_render(const Ie_Progressive &p, Ie_Progressive_R
 		for (int c = 0; c < p.components; c++) {
 			const Ie_Progressive_Plane &plane = p.planes[c];
 			const int nx = scale * p.hmax / plane.h, ny = scale * p.vmax / plane.v;
+			const Idct_Row idct = idct_for(nx, ny);
+			const Idct_Basis &basis_x = basis(nx), &basis_y = basis(ny);
 			for (int by = 0; by < plane.v; by++)
 				for (int bx = 0; bx < plane.blocks_w; bx++)
-					idct_block(block_at(plane, bx, my * plane.v + by), plane.quant, nx, ny,
-						   &samples[c][size_t(by * ny) * plane_w + size_t(bx * nx)], plane_w);
+					idct(block_at(plane, bx, my * plane.v + by), plane.quant, basis_x, basis_y,
+					     &samples[c][size_t(by * ny) * plane_w + size_t(bx * nx)], plane_w);
 		}
 		const int y0 = my * band_h, count = std::min(band_h, out_h - y0);
 		for (int y = 0; y < count; y++) {
