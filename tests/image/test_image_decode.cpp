@@ -2,7 +2,7 @@
  * equals libjpeg's own reading of the file, over sizes from 1 x 1, every
  * common sampling, scan scripts with and without successive approximation,
  * restart intervals, and each scale, on the processor's bit operations and
- * on the portable ones; its pixels are libjpeg's scaled decoding within
+ * on the portable ones, on one thread and on two; its pixels are libjpeg's scaled decoding within
  * the rounding of a different inverse DCT. PNG: the rows are libpng's, byte
  * for byte, for every colour kind, filter and split of the image data; the
  * unfilter's fast path is its reference's. Anything either does not take
@@ -20,6 +20,7 @@
 #include <string>
 #include <vector>
 
+#include "ie-engine-private.h"
 #include "ie-image-decode.h"
 #include "ie-image-png.h"
 #include "ie-image-progressive.h"
@@ -198,8 +199,12 @@ TEST(ProgressiveJpeg, CoefficientsAreLibjpegsOnEveryShapeScriptAndScale)
 				const Bytes file = encode(test_pixels(size.first, size.second, e.components, uint32_t(size.first * 7 + variant), noise),
 							  size.first, size.second, e);
 				for (int divisor : { 1, 2, 4, 8 })
-					for (bool portable : { false, true }) {
-						const std::string at = std::to_string(size.first) + "x" + std::to_string(size.second) +
+					for (int path = 0; path < 4; path++) {
+						/* Each bit operation path, on one thread and on two. */
+						const bool portable = path & 1;
+						const int threads = 1 + (path >> 1);
+						iel_thread_count_set(threads);
+						const std::string at = std::to_string(threads) + " threads, " + std::to_string(size.first) + "x" + std::to_string(size.second) +
 								       " comps " + std::to_string(e.components) + " " +
 								       std::to_string(e.h0) + "x" + std::to_string(e.v0) + " variant " +
 								       std::to_string(variant) + " /" + std::to_string(divisor) +
@@ -214,7 +219,8 @@ TEST(ProgressiveJpeg, CoefficientsAreLibjpegsOnEveryShapeScriptAndScale)
 						runs++;
 					}
 			}
-	EXPECT_EQ(runs, 7 * 5 * 4 * 4 * 2);
+	iel_thread_count_set(0);
+	EXPECT_EQ(runs, 7 * 5 * 4 * 4 * 4);
 
 	/* Larger pictures have rare symbols, whose codes are longer than the
 	 * one-look-up tables hold. */
@@ -223,12 +229,14 @@ TEST(ProgressiveJpeg, CoefficientsAreLibjpegsOnEveryShapeScriptAndScale)
 		e.quality = quality;
 		const Bytes file = encode(test_pixels(480, 320, 3, 99, quality == 100 ? 60 : 2), 480, 320, e);
 		for (bool portable : { false, true }) {
+			iel_thread_count_set(portable ? 1 : 2);
 			Ie_Progressive p;
 			ASSERT_EQ(read_progressive(file, 480, 320, portable, &p), Ie_Progressive_Status::DONE);
 			EXPECT_EQ(differing_coefficients(file, p), 0) << quality << (portable ? " portable" : "");
 			ie_progressive_free(&p);
 		}
 	}
+	iel_thread_count_set(0);
 }
 
 /* Each scale libjpeg's decoding reaches without upsampling, as PSNR: the

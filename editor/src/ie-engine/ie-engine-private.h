@@ -44,6 +44,12 @@ size_t iel_byte_count(uint32_t width, uint32_t height, unsigned bytes_per_pixel,
 int iel_cpu_has_avx2(void);
 int iel_cpu_has_avx512(void);
 
+/* How many threads a routine may split its work over, where the result is
+ * the same whatever the count: the processor's cores, IEL_THREADS=N in the
+ * environment, or what iel_thread_count_set gave (0 restores the default). */
+int iel_thread_count(void);
+void iel_thread_count_set(int count);
+
 /* Rotation: pixel loops without checks. */
 void iel_rotate_reference(const uint8_t *src, uint8_t *dst, uint32_t width, uint32_t height,
 			  int bytes_per_pixel, unsigned int rotation);

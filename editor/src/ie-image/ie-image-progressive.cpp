@@ -13,10 +13,17 @@
 
 #include <emmintrin.h>
 
+#include <algorithm>
+#include <atomic>
 #include <cmath>
 #include <cstdlib>
 #include <cstring>
+#include <memory>
+#include <system_error>
+#include <thread>
 #include <vector>
+
+#include "ie-engine-private.h"
 
 namespace {
 
@@ -115,7 +122,6 @@ constexpr int FAST_BITS = 10;
 constexpr uint16_t REFINE_VALUE = 1 << 12, REFINE_NEGATIVE = 1 << 13, REFINE_END_OF_BAND = 1 << 14;
 
 struct Huffman {
-	bool defined = false;
 	/* By the next FAST_BITS bits: code length << 8 | symbol; 0 for a
 	 * longer code. */
 	uint16_t fast[1 << FAST_BITS];
@@ -184,7 +190,6 @@ bool huffman_build(Huffman *t, const uint8_t counts[16], const uint8_t *values, 
 			t->fast_refine[look] = entry;
 		}
 	}
-	t->defined = true;
 	return true;
 }
 
@@ -209,11 +214,22 @@ inline int huffman_decode(Bits &b, const Huffman &t)
 
 /* ---- Scans ---- */
 
+/* A scan as read from its header, with everything its decoding needs:
+ * the tables as they stood at its start, its entropy-coded bytes. */
 struct Scan {
 	int count;
 	int comp[MAX_COMPONENTS];
 	int dc_table[MAX_COMPONENTS], ac_table[MAX_COMPONENTS];
 	int ss, se, ah, al;
+	const Huffman *dc[MAX_COMPONENTS], *ac;
+	int restart_interval;
+	const uint8_t *data, *end;
+};
+
+/* What runs from block to block within a scan. */
+struct Scan_State {
+	int dc_pred[MAX_COMPONENTS];
+	uint32_t eobrun;
 };
 
 /* The bit work of the scans, done three ways: with the processor's
@@ -224,7 +240,10 @@ enum Bit_Ops { PORTABLE, POPCNT, POPCNT_PDEP };
 
 struct Decoder {
 	Ie_Progressive *out;
-	Huffman dc[4], ac[4];
+	/* Every table defined; a scan keeps the ones current at its start. */
+	std::vector<std::unique_ptr<Huffman>> tables;
+	const Huffman *dc[4] = {}, *ac[4] = {};
+	std::vector<Scan> scans;
 	uint16_t quant[4][64];
 	bool quant_defined[4] = {};
 	bool quant_latched[MAX_COMPONENTS] = {};
@@ -236,9 +255,6 @@ struct Decoder {
 	uint64_t *nonzero[MAX_COMPONENTS] = {};
 	int target_w = 0, target_h = 0;
 	Bit_Ops ops = PORTABLE;
-	/* State across the blocks of a scan. */
-	int dc_pred[MAX_COMPONENTS] = {};
-	uint32_t eobrun = 0;
 
 	~Decoder()
 	{
@@ -309,10 +325,11 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE uint64_t nth_bit(uint64_t v, int n)
 
 /* One block of a scan; false on a code no table holds or a run past the
  * band, which libjpeg would only warn about. */
-template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_dc_first(Decoder &d, Bits &b, const Scan &s, int slot, const Block &block)
+template <Bit_Ops Ops>
+IE_ALWAYS_INLINE bool decode_dc_first(Scan_State &st, Bits &b, const Scan &s, int slot, const Block &block)
 {
 	b.ensure();
-	const int size = huffman_decode(b, d.dc[s.dc_table[slot]]);
+	const int size = huffman_decode(b, *s.dc[slot]);
 	if (size < 0 || size > 11)
 		return false;
 	int diff = 0;
@@ -320,8 +337,8 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_dc_first(Decoder &d, Bits &b
 		b.ensure();
 		diff = extend(b.take(size), size);
 	}
-	d.dc_pred[slot] += diff;
-	block.coef[0] = int16_t(uint32_t(d.dc_pred[slot]) << s.al);
+	st.dc_pred[slot] += diff;
+	block.coef[0] = int16_t(uint32_t(st.dc_pred[slot]) << s.al);
 	return true;
 }
 
@@ -342,13 +359,13 @@ inline void put_first(const Block &block, int k, int value, int al)
 	*block.nonzero |= uint64_t(stored != 0) << k;
 }
 
-template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_first(Decoder &d, Bits &b, const Scan &s, const Block &block)
+template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_first(Scan_State &st, Bits &b, const Scan &s, const Block &block)
 {
-	if (d.eobrun > 0) {
-		d.eobrun--;
+	if (st.eobrun > 0) {
+		st.eobrun--;
 		return true;
 	}
-	const Huffman &t = d.ac[s.ac_table[0]];
+	const Huffman &t = *s.ac;
 	for (int k = s.ss; k <= s.se;) {
 		b.ensure();
 		const int32_t fast = t.fast_ac[b.peek(FAST_BITS)];
@@ -373,12 +390,12 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_first(Decoder &d, Bits &b
 		} else if (run == 15) {
 			k += 16;
 		} else {
-			d.eobrun = 1u << run;
+			st.eobrun = 1u << run;
 			if (run) {
 				b.ensure();
-				d.eobrun += b.take(run);
+				st.eobrun += b.take(run);
 			}
-			d.eobrun--;
+			st.eobrun--;
 			break;
 		}
 	}
@@ -437,12 +454,14 @@ IE_ALWAYS_INLINE void correct(Bits &b, const Block &block, uint64_t which, int p
 /* Correction bits go to the coefficients already non-zero; a new
  * coefficient (of magnitude 1 << al) goes to the zero one that the run of
  * zeros ends on. */
-template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Decoder &d, Bits &b, const Scan &s, const Block &block)
+template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bits &b, const Scan &s, const Block &block)
 {
 	const int p1 = 1 << s.al;
+	const uint64_t in_band = band(0, s.se);
+	uint64_t nonzero = *block.nonzero;
 	int k = s.ss;
-	if (d.eobrun == 0) {
-		const Huffman &t = d.ac[s.ac_table[0]];
+	if (st.eobrun == 0) {
+		const Huffman &t = *s.ac;
 		while (k <= s.se) {
 			/* Enough for the code, its bits and most corrections. */
 			b.fill();
@@ -464,41 +483,37 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Decoder &d, Bits &
 						return false;
 					value = b.take(1) ? p1 : -p1;
 				} else if (run != 15) {
-					d.eobrun = 1u << run;
+					st.eobrun = 1u << run;
 					if (run)
-						d.eobrun += b.take(run);
+						st.eobrun += b.take(run);
 					break;
 				}
 			}
-			/* Past `run` zeros to the next one, or off the band; the
-			 * places passed that are not zeros hold corrections. */
-			const uint64_t ahead = band(k, s.se);
-			const uint64_t next = nth_bit<Ops>(~*block.nonzero & ahead, run);
-			int at, passed;
-			if (__builtin_expect(next != 0, 1)) {
-				at = __builtin_ctzll(next);
-				passed = at - k - run;
-			} else {
-				at = s.se + 1;
-				passed = count_bits<Ops>(*block.nonzero & ahead);
-			}
-			correct<Ops>(b, block, *block.nonzero & ahead & ~band(at, 63), passed, k, p1);
+			/* Past `run` zeros to the next one (`next`, a single bit), or
+			 * off the band (0); the places passed that are not zeros hold
+			 * corrections. */
+			const uint64_t ahead = in_band & (~0ull << k);
+			const uint64_t next = nth_bit<Ops>(~nonzero & ahead, run);
+			const uint64_t passed = nonzero & ahead & (next - 1);
+			const int at = next ? __builtin_ctzll(next) : s.se + 1;
+			correct<Ops>(b, block, passed, next ? at - k - run : count_bits<Ops>(passed), k, p1);
 			if (value) {
-				if (at > s.se)
+				if (!next)
 					return false;
 				if (at < block.kept)
 					block.coef[at] = int16_t(value);
-				*block.nonzero |= 1ull << at;
+				nonzero |= next;
 			}
 			k = at + 1;
 		}
 	}
-	if (d.eobrun > 0) {
+	if (st.eobrun > 0) {
 		b.fill();
-		const uint64_t rest = *block.nonzero & band(k, s.se);
+		const uint64_t rest = nonzero & band(k, s.se);
 		correct<Ops>(b, block, rest, count_bits<Ops>(rest), k, p1);
-		d.eobrun--;
+		st.eobrun--;
 	}
+	*block.nonzero = nonzero;
 	return true;
 }
 
@@ -527,8 +542,8 @@ enum Scan_Kind { INTERLEAVED_DC, DC_FIRST, DC_REFINE, AC_FIRST, AC_REFINE };
  * (*ux, *uy). A loop of its own, with the bit reader in registers: the
  * refinement loop is most of the decoding. */
 template <Bit_Ops Ops, Scan_Kind Kind>
-__attribute__((noinline)) bool decode_units(Decoder &d, const Scan &s, Bits &bits_io, long count, int units_x, int *ux,
-					     int *uy)
+__attribute__((noinline)) bool decode_units(const Decoder &d, Scan_State &st, const Scan &s, Bits &bits_io, long count,
+					     int units_x, int *ux, int *uy)
 {
 	Bits bits = bits_io;
 	int x = *ux, y = *uy;
@@ -544,17 +559,17 @@ __attribute__((noinline)) bool decode_units(Decoder &d, const Scan &s, Bits &bit
 						if (s.ah)
 							decode_dc_refine<Ops>(bits, s, block);
 						else
-							ok = decode_dc_first<Ops>(d, bits, s, c, block);
+							ok = decode_dc_first<Ops>(st, bits, s, c, block);
 					}
 			}
 		} else if constexpr (Kind == DC_FIRST) {
-			ok = decode_dc_first<Ops>(d, bits, s, 0, block_of(d, c0, x, y));
+			ok = decode_dc_first<Ops>(st, bits, s, 0, block_of(d, c0, x, y));
 		} else if constexpr (Kind == DC_REFINE) {
 			decode_dc_refine<Ops>(bits, s, block_of(d, c0, x, y));
 		} else if constexpr (Kind == AC_FIRST) {
-			ok = decode_ac_first<Ops>(d, bits, s, block_of(d, c0, x, y));
+			ok = decode_ac_first<Ops>(st, bits, s, block_of(d, c0, x, y));
 		} else {
-			ok = decode_ac_refine<Ops>(d, bits, s, block_of(d, c0, x, y));
+			ok = decode_ac_refine<Ops>(st, bits, s, block_of(d, c0, x, y));
 		}
 		if (++x == units_x) {
 			x = 0;
@@ -567,9 +582,9 @@ __attribute__((noinline)) bool decode_units(Decoder &d, const Scan &s, Bits &bit
 	return ok;
 }
 
-template <Bit_Ops Ops> Status decode_scan(Decoder &d, const Scan &s, const uint8_t *&pos, const uint8_t *end)
+template <Bit_Ops Ops> Status decode_scan(const Decoder &d, const Scan &s)
 {
-	Ie_Progressive &img = *d.out;
+	const Ie_Progressive &img = *d.out;
 	const bool dc = s.ss == 0;
 	const bool first = s.ah == 0;
 	/* A single-component scan walks that component's own blocks, one a
@@ -578,44 +593,66 @@ template <Bit_Ops Ops> Status decode_scan(Decoder &d, const Scan &s, const uint8
 	const int units_x = s.count == 1 ? single.used_w : img.mcus_x;
 	const int units_y = s.count == 1 ? single.used_h : img.mcus_y;
 	const long units = long(units_x) * units_y;
-	const long interval = d.restart_interval ? d.restart_interval : units;
+	const long interval = s.restart_interval ? s.restart_interval : units;
+	const uint8_t *pos = s.data;
 	int next_restart = 0;
 	long unit = 0;
 	int ux = 0, uy = 0;
 	while (unit < units) {
-		for (int c = 0; c < s.count; c++)
-			d.dc_pred[c] = 0;
-		d.eobrun = 0;
-		const uint8_t *seg_end = segment_end(pos, end);
+		Scan_State st = {};
+		const uint8_t *seg_end = segment_end(pos, s.end);
 		Bits bits(pos, seg_end);
 		const long stop = std::min(units, unit + interval);
 		bool ok;
 		const long count = stop - unit;
 		if (s.count > 1)
-			ok = decode_units<Ops, INTERLEAVED_DC>(d, s, bits, count, units_x, &ux, &uy);
+			ok = decode_units<Ops, INTERLEAVED_DC>(d, st, s, bits, count, units_x, &ux, &uy);
 		else if (dc && first)
-			ok = decode_units<Ops, DC_FIRST>(d, s, bits, count, units_x, &ux, &uy);
+			ok = decode_units<Ops, DC_FIRST>(d, st, s, bits, count, units_x, &ux, &uy);
 		else if (dc)
-			ok = decode_units<Ops, DC_REFINE>(d, s, bits, count, units_x, &ux, &uy);
+			ok = decode_units<Ops, DC_REFINE>(d, st, s, bits, count, units_x, &ux, &uy);
 		else if (first)
-			ok = decode_units<Ops, AC_FIRST>(d, s, bits, count, units_x, &ux, &uy);
+			ok = decode_units<Ops, AC_FIRST>(d, st, s, bits, count, units_x, &ux, &uy);
 		else
-			ok = decode_units<Ops, AC_REFINE>(d, s, bits, count, units_x, &ux, &uy);
+			ok = decode_units<Ops, AC_REFINE>(d, st, s, bits, count, units_x, &ux, &uy);
 		unit = stop;
-		if (!ok)
-			return Status::NOT_OURS;
-		if (bits.overrun())
+		if (!ok || bits.overrun())
 			return Status::NOT_OURS;
 		pos = seg_end;
 		if (unit < units) {
 			/* The interval's RSTn, in turn. */
-			if (end - pos < 2 || pos[1] != 0xD0 + next_restart)
+			if (s.end - pos < 2 || pos[1] != 0xD0 + next_restart)
 				return Status::NOT_OURS;
 			pos += 2;
 			next_restart = (next_restart + 1) & 7;
 		}
 	}
 	return Status::DONE;
+}
+
+Status decode_scan_with(Bit_Ops ops, const Decoder &d, const Scan &s)
+{
+	switch (ops) {
+	case POPCNT_PDEP:
+		return decode_scan<POPCNT_PDEP>(d, s);
+	case POPCNT:
+		return decode_scan<POPCNT>(d, s);
+	case PORTABLE:
+		break;
+	}
+	return decode_scan<PORTABLE>(d, s);
+}
+
+/* Where a scan's entropy-coded bytes end: the first marker after `p` that
+ * is not one of its restart markers. */
+const uint8_t *scan_end(const uint8_t *p, const uint8_t *end, bool restarts)
+{
+	for (;;) {
+		p = segment_end(p, end);
+		if (!restarts || end - p < 2 || p[1] < 0xD0 || p[1] > 0xD7)
+			return p;
+		p += 2;
+	}
 }
 
 /* Bit deposit is microcode on the first two Zen generations. */
@@ -717,8 +754,11 @@ Status read_huffman_tables(Decoder &d, const uint8_t *p, int length)
 			total += p[1 + i];
 		if (cls > 1 || id > 3 || total > 256 || length < 17 + total)
 			return Status::NOT_OURS;
-		if (!huffman_build(cls ? &d.ac[id] : &d.dc[id], p + 1, p + 17, total, cls == 1))
+		std::unique_ptr<Huffman> table(new (std::nothrow) Huffman);
+		if (!table || !huffman_build(table.get(), p + 1, p + 17, total, cls == 1))
 			return Status::NOT_OURS;
+		(cls ? d.ac : d.dc)[id] = table.get();
+		d.tables.push_back(std::move(table));
 		p += 17 + total;
 		length -= 17 + total;
 	}
@@ -806,7 +846,9 @@ Status read_scan(Decoder &d, const uint8_t *p, int length, Scan *s)
 			d.quant_latched[c] = true;
 		}
 		const bool needs_dc = dc && s->ah == 0, needs_ac = !dc;
-		if ((needs_dc && !d.dc[s->dc_table[i]].defined) || (needs_ac && !d.ac[s->ac_table[i]].defined))
+		s->dc[i] = d.dc[s->dc_table[i]];
+		s->ac = d.ac[s->ac_table[0]];
+		if ((needs_dc && !s->dc[i]) || (needs_ac && !s->ac))
 			return Status::NOT_OURS;
 	}
 	return Status::DONE;
@@ -950,6 +992,51 @@ inline uint8_t clamp_byte(int v)
 	return uint8_t(v < 0 ? 0 : v > 255 ? 255 : v);
 }
 
+/* The scans in their order, or in two chains at once where threads are
+ * allowed: the chroma components' AC scans touch nothing any other scan
+ * does (the DC scans write only each block's first coefficient), so both
+ * chains give the very coefficients one would. */
+Status decode_scans(const Decoder &d, Ie_Decode_Stop stop, void *stop_data)
+{
+	std::atomic<bool> abandoned{ false };
+	auto chroma_ac = [](const Scan &s) { return s.ss > 0 && s.comp[0] != 0; };
+	auto run = [&](int chain) {
+		/* Chain 0: all scans, or those of the luma and every DC scan; 1: the
+		 * chroma AC scans. */
+		for (const Scan &s : d.scans) {
+			if (chain == 1 ? !chroma_ac(s) : chain == 0 && chroma_ac(s))
+				continue;
+			if (abandoned.load(std::memory_order_relaxed))
+				return Status::CANCELLED;
+			const Status status = decode_scan_with(d.ops, d, s);
+			/* Only this thread may ask; the other stops with it. */
+			const bool stopped = chain != 1 && stop && stop(stop_data);
+			if (status != Status::DONE || stopped) {
+				abandoned.store(true, std::memory_order_relaxed);
+				return status != Status::DONE ? status : Status::CANCELLED;
+			}
+		}
+		return Status::DONE;
+	};
+	const bool split = iel_thread_count() > 1 && std::any_of(d.scans.begin(), d.scans.end(), chroma_ac);
+	if (!split)
+		return run(-1);
+	Status other = Status::DONE;
+	std::thread helper;
+	try {
+		helper = std::thread([&] { other = run(1); });
+	} catch (const std::system_error &) {
+		other = run(1);
+	}
+	const Status own = run(0);
+	if (helper.joinable())
+		helper.join();
+	/* A failure outranks a stop: the file then goes to libjpeg. */
+	if (own == Status::NOT_OURS || other == Status::NOT_OURS)
+		return Status::NOT_OURS;
+	return own != Status::DONE ? own : other;
+}
+
 } // namespace
 
 Ie_Progressive_Status ie_progressive_read(const uint8_t *data, size_t size, int target_w, int target_h,
@@ -1004,20 +1091,16 @@ Ie_Progressive_Status ie_progressive_read(const uint8_t *data, size_t size, int 
 			Scan scan;
 			step = read_scan(*d, body, length - 2, &scan);
 			if (step == Status::DONE) {
-				switch (d->ops) {
-				case POPCNT_PDEP:
-					step = decode_scan<POPCNT_PDEP>(*d, scan, pos, end);
-					break;
-				case POPCNT:
-					step = decode_scan<POPCNT>(*d, scan, pos, end);
-					break;
-				case PORTABLE:
-					step = decode_scan<PORTABLE>(*d, scan, pos, end);
-					break;
+				scan.restart_interval = d->restart_interval;
+				scan.data = pos;
+				scan.end = scan_end(pos, end, d->restart_interval > 0);
+				pos = scan.end;
+				try {
+					d->scans.push_back(scan);
+				} catch (const std::bad_alloc &) {
+					step = Status::NOT_OURS;
 				}
 			}
-			if (step == Status::DONE && stop && stop(stop_data))
-				step = Status::CANCELLED;
 		}
 		if (d->restart_interval < 0)
 			step = Status::NOT_OURS;
@@ -1026,6 +1109,8 @@ Ie_Progressive_Status ie_progressive_read(const uint8_t *data, size_t size, int 
 			break;
 		}
 	}
+	if (status == Status::DONE)
+		status = decode_scans(*d, stop, stop_data);
 	delete d;
 	return status;
 }
