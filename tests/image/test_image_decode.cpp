@@ -479,10 +479,16 @@ TEST(PngDecode, RowsAreLibpngsForEveryKindFilterAndSplit)
 				bool alpha = false;
 				ASSERT_TRUE(ie_png_probe(file.data(), file.size(), &w, &h, &alpha)) << at;
 				EXPECT_EQ(alpha, bool(colour & PNG_COLOR_MASK_ALPHA)) << at;
-				Png_Sink sink{ {}, w };
-				ASSERT_EQ(our_png_rows(file, &sink), Ie_Png_Status::DONE) << at;
 				int lw = 0, lh = 0;
-				EXPECT_TRUE(sink.pixels == libpng_rows(file, &lw, &lh)) << at;
+				const Bytes theirs = libpng_rows(file, &lw, &lh);
+				/* On one thread, and inflating on a second. */
+				for (int threads : { 1, 2 }) {
+					iel_thread_count_set(threads);
+					Png_Sink sink{ {}, w };
+					ASSERT_EQ(our_png_rows(file, &sink), Ie_Png_Status::DONE) << at << ", " << threads << " threads";
+					EXPECT_TRUE(sink.pixels == theirs) << at << ", " << threads << " threads";
+				}
+				iel_thread_count_set(0);
 			}
 }
 
@@ -537,6 +543,17 @@ TEST(PngDecode, HandsBackWhatItDoesNotTake)
 	for (size_t i = length / 2; i < length; i++)
 		short_data[idat + 8 + i] = 0;
 	EXPECT_TRUE(refused(recrc(short_data)));
+
+	/* The same when inflating on a second thread: the damage is found
+	 * there, in a later strip. */
+	iel_thread_count_set(2);
+	const Bytes tall = write_png(test_pixels(w, 200, 3, 1, 5), w, 200, Png_Options());
+	ASSERT_FALSE(refused(tall));
+	Bytes tall_damaged = tall;
+	tall_damaged.resize(tall.size() - 40);
+	tall_damaged.insert(tall_damaged.end(), tall.end() - 12, tall.end());
+	EXPECT_TRUE(refused(tall_damaged));
+	iel_thread_count_set(0);
 }
 
 } // namespace

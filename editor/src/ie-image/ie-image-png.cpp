@@ -9,10 +9,15 @@
 
 #include <immintrin.h>
 
+#include <algorithm>
+#include <condition_variable>
 #include <cstdlib>
 #include <cstring>
 #include <memory>
+#include <mutex>
 #include <new>
+#include <system_error>
+#include <thread>
 #include <vector>
 
 #include "ie-engine-private.h"
@@ -241,12 +246,93 @@ bool ie_png_probe(const uint8_t *data, size_t size, int *w, int *h, bool *alpha)
 
 namespace {
 
-/* One decoding's buffers and inflate state. */
-struct Png_Work {
-	inflate_state zlib;
-	std::vector<uint8_t> rows;  /* STRIP_ROWS filtered rows, each after its filter byte */
-	std::vector<uint8_t> prior; /* the last row of the previous strip, unfiltered */
-	std::vector<uint8_t> strip; /* BGRA */
+/* Strips in flight between the two threads of a pipelined decoding. */
+constexpr int RING_STRIPS = 4;
+
+/* The inflating side: the IDAT chunks in, filtered rows out. */
+class Inflater {
+public:
+	Inflater(const uint8_t *data, size_t size) : walk_(data, size)
+	{
+		/* From the chunk after IHDR, which read_header checked. */
+		Chunk ihdr;
+		walk_.next(&ihdr);
+		isal_inflate_init(&zlib_);
+		zlib_.crc_flag = ISAL_ZLIB;
+	}
+
+	/* Fills `size` bytes, or fails: damaged data, or too little of it.
+	 * The inflater may hold output back after it has taken all its input,
+	 * so a call with no input left is made before giving up. */
+	bool fill(uint8_t *to, size_t size)
+	{
+		zlib_.next_out = to;
+		zlib_.avail_out = uint32_t(size);
+		while (zlib_.avail_out > 0) {
+			if (zlib_.avail_in == 0 && input_left_)
+				input_left_ = feed();
+			const uint32_t before = zlib_.avail_out;
+			if (isal_inflate(&zlib_) != ISAL_DECOMP_OK)
+				return false;
+			if (zlib_.block_state == ISAL_BLOCK_FINISH)
+				return zlib_.avail_out == 0;
+			if (zlib_.avail_out == before && zlib_.avail_in == 0 && !input_left_)
+				return false;
+		}
+		return true;
+	}
+
+	/* The stream must end whole, with its checksum, and the file with
+	 * IEND. A little image data beyond the rows is passed over; much more
+	 * is left to libpng rather than inflated here. */
+	bool finish()
+	{
+		for (int spilled = 0; zlib_.block_state != ISAL_BLOCK_FINISH; spilled++) {
+			uint8_t spill[256];
+			if (spilled == 16 || (!fill(spill, sizeof(spill)) && zlib_.block_state != ISAL_BLOCK_FINISH))
+				return false;
+		}
+		Chunk chunk;
+		while (!ended_ && walk_.next(&chunk)) {
+			if (is(chunk, "IEND"))
+				ended_ = true;
+			else if (is(chunk, "PLTE") || is(chunk, "tRNS") || is(chunk, "IHDR"))
+				return false;
+		}
+		return ended_;
+	}
+
+private:
+	/* The next IDAT, which must follow the last. */
+	bool feed()
+	{
+		Chunk chunk;
+		while (walk_.next(&chunk)) {
+			if (is(chunk, "IDAT")) {
+				if (data_done_)
+					return false;
+				in_data_ = true;
+				zlib_.next_in = const_cast<uint8_t *>(chunk.body);
+				zlib_.avail_in = chunk.length;
+				if (chunk.length)
+					return true;
+				continue;
+			}
+			if (is(chunk, "PLTE") || is(chunk, "tRNS") || is(chunk, "IHDR"))
+				return false;
+			if (is(chunk, "IEND")) {
+				ended_ = true;
+				return false;
+			}
+			if (in_data_)
+				data_done_ = true;
+		}
+		return false;
+	}
+
+	Chunk_Walk walk_;
+	inflate_state zlib_;
+	bool in_data_ = false, data_done_ = false, ended_ = false, input_left_ = true;
 };
 
 /* RGB to BGRA four pixels a step; reads 4 bytes past the last pixel. */
@@ -304,6 +390,51 @@ void to_bgra(const uint8_t *from, uint8_t *to, uint32_t w, int colour)
 	}
 }
 
+/* The other side: filtered rows in, BGRA rows out, in order. */
+class Unfilterer {
+public:
+	Unfilterer(const Header &header, Ie_Png_Rows rows, void *rows_data)
+		: header_(header), row_bytes_(size_t(header.w) * size_t(header.bpp)), rows_(rows), rows_data_(rows_data),
+		  prior_(row_bytes_), strip_(size_t(header.w) * 4 * STRIP_ROWS)
+	{
+	}
+
+	size_t stride() const { return row_bytes_ + 1; }
+
+	/* `count` rows, each after its filter byte. */
+	bool take(uint8_t *filtered, int count)
+	{
+		for (int i = 0; i < count; i++, y_++) {
+			uint8_t *row = filtered + stride() * size_t(i);
+			const uint8_t *prior = i > 0 ? row - stride() + 1 : y_ > 0 ? prior_.data() : nullptr;
+			if (!ie_png_unfilter(row[0], row + 1, prior, row_bytes_, header_.bpp))
+				return false;
+			to_bgra(row + 1, &strip_[size_t(header_.w) * 4 * size_t(i)], header_.w, header_.colour);
+		}
+		memcpy(prior_.data(), filtered + stride() * size_t(count - 1) + 1, row_bytes_);
+		rows_(rows_data_, strip_.data(), count);
+		return true;
+	}
+
+private:
+	const Header header_;
+	const size_t row_bytes_;
+	const Ie_Png_Rows rows_;
+	void *const rows_data_;
+	uint32_t y_ = 0;
+	std::vector<uint8_t> prior_; /* the last row taken, unfiltered */
+	std::vector<uint8_t> strip_; /* BGRA */
+};
+
+/* The strips of one decoding, handed from the inflating thread to the
+ * unfiltering one. */
+struct Strip_Ring {
+	std::mutex lock;
+	std::condition_variable changed;
+	int produced = 0, consumed = 0;
+	bool failed = false, abandoned = false;
+};
+
 } // namespace
 
 Ie_Png_Status ie_png_decode(const uint8_t *data, size_t size, Ie_Png_Rows rows, void *rows_data, Ie_Decode_Stop stop,
@@ -312,104 +443,80 @@ Ie_Png_Status ie_png_decode(const uint8_t *data, size_t size, Ie_Png_Rows rows, 
 	Header header;
 	if (!read_header(data, size, &header))
 		return Ie_Png_Status::NOT_OURS;
-	const size_t row_bytes = size_t(header.w) * size_t(header.bpp);
-	const size_t stride = row_bytes + 1;
-	std::unique_ptr<Png_Work> work(new (std::nothrow) Png_Work);
-	if (!work)
-		return Ie_Png_Status::NOT_OURS;
+	const int strips = int((header.h + STRIP_ROWS - 1) / STRIP_ROWS);
+	auto strip_rows = [&](int i) { return int(std::min<uint32_t>(STRIP_ROWS, header.h - uint32_t(i) * STRIP_ROWS)); };
+	std::unique_ptr<Inflater> inflater;
+	std::unique_ptr<Unfilterer> unfilterer;
+	std::vector<std::vector<uint8_t>> buffers;
+	const bool pipelined = iel_thread_count() > 1 && strips > 1;
 	try {
+		inflater.reset(new Inflater(data, size));
+		unfilterer.reset(new Unfilterer(header, rows, rows_data));
 		/* Room for the colour conversion's reads past the last row. */
-		work->rows.resize(stride * STRIP_ROWS + 16);
-		work->prior.resize(row_bytes);
-		work->strip.resize(size_t(header.w) * 4 * STRIP_ROWS);
+		buffers.assign(pipelined ? RING_STRIPS : 1, std::vector<uint8_t>(unfilterer->stride() * STRIP_ROWS + 16));
 	} catch (const std::bad_alloc &) {
 		return Ie_Png_Status::NOT_OURS;
 	}
-	isal_inflate_init(&work->zlib);
-	work->zlib.crc_flag = ISAL_ZLIB;
+	const size_t stride = unfilterer->stride();
 
-	/* From the chunk after IHDR, which read_header checked. */
-	Chunk_Walk walk(data, size);
-	Chunk chunk;
-	walk.next(&chunk);
-	bool in_data = false, data_done = false, ended = false;
-	uint32_t y = 0;
-	/* Feeds the inflater the next IDAT, which must follow the last. */
-	auto feed = [&]() {
-		while (walk.next(&chunk)) {
-			if (is(chunk, "IDAT")) {
-				if (data_done)
-					return false;
-				in_data = true;
-				work->zlib.next_in = const_cast<uint8_t *>(chunk.body);
-				work->zlib.avail_in = chunk.length;
-				if (chunk.length)
-					return true;
-				continue;
-			}
-			if (is(chunk, "PLTE") || is(chunk, "tRNS") || is(chunk, "IHDR"))
-				return false;
-			if (is(chunk, "IEND")) {
-				ended = true;
-				return false;
-			}
-			if (in_data)
-				data_done = true;
-		}
-		return false;
-	};
-
-	/* Fills `size` bytes, or as many as the stream holds if it ends first
-	 * (then false). The inflater may hold output back after it has taken
-	 * all its input, so a call with no input left is made before giving
-	 * up. */
-	bool input_left = true;
-	auto inflate_into = [&](uint8_t *to, size_t size) {
-		work->zlib.next_out = to;
-		work->zlib.avail_out = uint32_t(size);
-		while (work->zlib.avail_out > 0) {
-			if (work->zlib.avail_in == 0 && input_left)
-				input_left = feed();
-			const uint32_t before = work->zlib.avail_out;
-			if (isal_inflate(&work->zlib) != ISAL_DECOMP_OK)
-				return false;
-			if (work->zlib.block_state == ISAL_BLOCK_FINISH)
-				return work->zlib.avail_out == 0;
-			if (work->zlib.avail_out == before && work->zlib.avail_in == 0 && !input_left)
-				return false;
-		}
-		return true;
-	};
-
-	while (y < header.h) {
-		if (stop && stop(stop_data))
-			return Ie_Png_Status::CANCELLED;
-		const int count = int(std::min<uint32_t>(STRIP_ROWS, header.h - y));
-		if (!inflate_into(work->rows.data(), stride * size_t(count)))
-			return Ie_Png_Status::NOT_OURS; /* damaged, or too little image data */
-		for (int i = 0; i < count; i++, y++) {
-			uint8_t *row = &work->rows[stride * size_t(i)];
-			const uint8_t *prior = i > 0 ? row - stride + 1 : y > 0 ? work->prior.data() : nullptr;
-			if (!ie_png_unfilter(row[0], row + 1, prior, row_bytes, header.bpp))
+	if (!pipelined) {
+		for (int i = 0; i < strips; i++) {
+			if (stop && stop(stop_data))
+				return Ie_Png_Status::CANCELLED;
+			if (!inflater->fill(buffers[0].data(), stride * size_t(strip_rows(i))) ||
+			    !unfilterer->take(buffers[0].data(), strip_rows(i)))
 				return Ie_Png_Status::NOT_OURS;
-			to_bgra(row + 1, &work->strip[size_t(header.w) * 4 * size_t(i)], header.w, header.colour);
 		}
-		memcpy(work->prior.data(), &work->rows[stride * size_t(count - 1) + 1], row_bytes);
-		rows(rows_data, work->strip.data(), count);
+		return inflater->finish() ? Ie_Png_Status::DONE : Ie_Png_Status::NOT_OURS;
 	}
-	/* The stream must end whole, with its checksum, and the file with IEND.
-	 * A little image data beyond the rows is passed over; much more is left
-	 * to libpng rather than inflated here. */
-	for (int spilled = 0; work->zlib.block_state != ISAL_BLOCK_FINISH; spilled++) {
-		uint8_t spill[256];
-		if (spilled == 16 || (!inflate_into(spill, sizeof(spill)) && work->zlib.block_state != ISAL_BLOCK_FINISH))
-			return Ie_Png_Status::NOT_OURS;
+
+	/* Inflating on a helper thread, a few strips ahead; the same rows in
+	 * the same order as on one thread. */
+	Strip_Ring ring;
+	bool finished = false;
+	auto inflate_all = [&] {
+		for (int i = 0; i < strips; i++) {
+			{
+				std::unique_lock<std::mutex> hold(ring.lock);
+				ring.changed.wait(hold, [&] { return ring.abandoned || i - ring.consumed < RING_STRIPS; });
+				if (ring.abandoned)
+					return;
+			}
+			const bool ok = inflater->fill(buffers[size_t(i % RING_STRIPS)].data(), stride * size_t(strip_rows(i)));
+			std::lock_guard<std::mutex> hold(ring.lock);
+			ring.failed = !ok;
+			ring.produced = ok ? i + 1 : ring.produced;
+			ring.changed.notify_all();
+			if (!ok)
+				return;
+		}
+		finished = inflater->finish();
+	};
+	std::thread helper;
+	try {
+		helper = std::thread(inflate_all);
+	} catch (const std::system_error &) {
+		return Ie_Png_Status::NOT_OURS;
 	}
-	while (!ended && walk.next(&chunk)) {
-		if (is(chunk, "IEND"))
-			ended = true;
-		else if (is(chunk, "PLTE") || is(chunk, "tRNS") || is(chunk, "IHDR"))
-			return Ie_Png_Status::NOT_OURS;
+	Ie_Png_Status status = Ie_Png_Status::DONE;
+	for (int i = 0; i < strips && status == Ie_Png_Status::DONE; i++) {
+		bool ready;
+		{
+			std::unique_lock<std::mutex> hold(ring.lock);
+			ring.changed.wait(hold, [&] { return ring.failed || ring.produced > i; });
+			ready = ring.produced > i;
+		}
+		if (!ready || !unfilterer->take(buffers[size_t(i % RING_STRIPS)].data(), strip_rows(i)))
+			status = Ie_Png_Status::NOT_OURS;
+		else if (stop && stop(stop_data))
+			status = Ie_Png_Status::CANCELLED;
+		std::lock_guard<std::mutex> hold(ring.lock);
+		ring.consumed = i + 1;
+		ring.abandoned = status != Ie_Png_Status::DONE;
+		ring.changed.notify_all();
 	}
-	return ended ? Ie_Png_Status::DONE : Ie_Png_Status::NOT_OURS;
+	helper.join();
+	if (status == Ie_Png_Status::DONE && !finished)
+		status = Ie_Png_Status::NOT_OURS;
+	return status;
 }
