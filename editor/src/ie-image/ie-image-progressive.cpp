@@ -439,16 +439,20 @@ inline uint64_t kept_mask(const Block &block)
 }
 
 /* The corrections of the `passed` non-zero coefficients of `which`, which
- * starts at k: kept ones (only near the band's start) then the rest. */
+ * starts at k: kept ones (only near the band's start) then the rest. The
+ * `code` bits of the symbol before them are still to be passed over: in
+ * the common case both go in one shift. */
 template <Bit_Ops Ops>
-IE_ALWAYS_INLINE void correct(Bits &b, const Block &block, uint64_t which, int passed, int k, int p1)
+IE_ALWAYS_INLINE void correct(Bits &b, const Block &block, uint64_t which, int passed, int k, int p1, int code)
 {
 	if (k < block.kept) {
+		b.skip(code);
+		code = 0;
 		const uint64_t kept = which & kept_mask(block);
 		passed -= count_bits<Ops>(kept);
 		correct_kept(b, block, kept, p1);
 	}
-	skip_corrections(b, passed);
+	skip_corrections(b, code + passed);
 }
 
 /* Correction bits go to the coefficients already non-zero; a new
@@ -465,10 +469,10 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bi
 		while (k <= s.se) {
 			/* Enough for the code, its bits and most corrections. */
 			b.fill();
-			int run, value = 0;
+			int run, value = 0, code = 0;
 			const uint16_t fast = t.fast_refine[b.peek(FAST_BITS)];
 			if (fast && !(fast & REFINE_END_OF_BAND)) {
-				b.skip(fast & 31);
+				code = fast & 31;
 				run = (fast >> 8) & 15;
 				if (fast & REFINE_VALUE)
 					value = fast & REFINE_NEGATIVE ? -p1 : p1;
@@ -496,7 +500,7 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bi
 			const uint64_t next = nth_bit<Ops>(~nonzero & ahead, run);
 			const uint64_t passed = nonzero & ahead & (next - 1);
 			const int at = next ? __builtin_ctzll(next) : s.se + 1;
-			correct<Ops>(b, block, passed, next ? at - k - run : count_bits<Ops>(passed), k, p1);
+			correct<Ops>(b, block, passed, next ? at - k - run : count_bits<Ops>(passed), k, p1, code);
 			if (value) {
 				if (!next)
 					return false;
@@ -510,7 +514,7 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bi
 	if (st.eobrun > 0) {
 		b.fill();
 		const uint64_t rest = nonzero & band(k, s.se);
-		correct<Ops>(b, block, rest, count_bits<Ops>(rest), k, p1);
+		correct<Ops>(b, block, rest, count_bits<Ops>(rest), k, p1, 0);
 		st.eobrun--;
 	}
 	*block.nonzero = nonzero;
