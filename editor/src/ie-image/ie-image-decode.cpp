@@ -1,5 +1,6 @@
-/* JPEG (libjpeg-turbo) and PNG (libpng) decoding into the area reducer; see
- * ie-image-decode.h. Both libraries report errors by longjmp: every
+/* JPEG and PNG decoding into the area reducer; see ie-image-decode.h. Our
+ * own decoders go first where they apply, libjpeg-turbo and libpng take
+ * what they hand back. Both libraries report errors by longjmp: every
  * resource a decode holds lives in a record that outlives the jump, and
  * nothing with a destructor sits in a frame the jump leaves. */
 #include "ie-image-decode.h"

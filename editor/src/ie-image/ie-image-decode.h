@@ -2,9 +2,11 @@
  * BGRA at a reduced size: a JPEG is scaled down by the decoder itself (its
  * inverse DCT at M/8 of the size) to the smallest size that still covers
  * the target, and the decoder's rows go into the area reducer as they come,
- * so no full-size copy of a large picture is ever held. Everything else
- * (and the JPEG and PNG kinds left out below) goes to Evas. Internal to
- * ie-image. */
+ * so no full-size copy of a large picture is ever held. Progressive JPEG
+ * and the common PNG kinds go through decoders of our own
+ * (ie-image-progressive, ie-image-png), the rest through libjpeg-turbo and
+ * libpng. Everything else (and the JPEG and PNG kinds left out below) goes
+ * to Evas. Internal to ie-image. */
 #ifndef IE_IMAGE_DECODE_H
 #define IE_IMAGE_DECODE_H
 

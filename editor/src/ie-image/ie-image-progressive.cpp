@@ -433,49 +433,47 @@ inline void skip_corrections(Bits &b, int n)
 	}
 }
 
-inline uint64_t kept_mask(const Block &block)
-{
-	return block.kept >= 64 ? ~0ull : (1ull << block.kept) - 1;
-}
-
-/* The corrections of the `passed` non-zero coefficients of `which`, which
- * starts at k: kept ones (only near the band's start) then the rest. The
- * `code` bits of the symbol before them are still to be passed over: in
- * the common case both go in one shift. */
+/* The corrections of the non-zero coefficients `which` (`count` of them):
+ * kept ones (only near the band's start) then the rest. The `code` bits
+ * of the symbol before them are still to be passed over: in the common
+ * case both go in one shift. */
 template <Bit_Ops Ops>
-IE_ALWAYS_INLINE void correct(Bits &b, const Block &block, uint64_t which, int passed, int k, int p1, int code)
+IE_ALWAYS_INLINE void correct(Bits &b, const Block &block, uint64_t kept_mask, uint64_t which, int count, int p1,
+			      int code)
 {
-	if (k < block.kept) {
+	const uint64_t kept = which & kept_mask;
+	if (kept) {
 		b.skip(code);
 		code = 0;
-		const uint64_t kept = which & kept_mask(block);
-		passed -= count_bits<Ops>(kept);
+		count -= count_bits<Ops>(kept);
 		correct_kept(b, block, kept, p1);
 	}
-	skip_corrections(b, code + passed);
+	skip_corrections(b, code + count);
 }
 
 /* Correction bits go to the coefficients already non-zero; a new
  * coefficient (of magnitude 1 << al) goes to the zero one that the run of
- * zeros ends on. */
+ * zeros ends on. The places still to come are a mask (`ahead`) rather than
+ * an index, which keeps the loop's state in registers. */
 template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bits &b, const Scan &s, const Block &block)
 {
 	const int p1 = 1 << s.al;
-	const uint64_t in_band = band(0, s.se);
+	const uint64_t kept_mask = block.kept >= 64 ? ~0ull : (1ull << block.kept) - 1;
 	uint64_t nonzero = *block.nonzero;
-	int k = s.ss;
+	uint64_t ahead = band(s.ss, s.se);
 	if (st.eobrun == 0) {
 		const Huffman &t = *s.ac;
-		while (k <= s.se) {
+		while (ahead) {
 			/* Enough for the code, its bits and most corrections. */
 			b.fill();
-			int run, value = 0, code = 0;
+			int run, code = 0;
+			bool value = false, negative = false;
 			const uint16_t fast = t.fast_refine[b.peek(FAST_BITS)];
 			if (fast && !(fast & REFINE_END_OF_BAND)) {
 				code = fast & 31;
 				run = (fast >> 8) & 15;
-				if (fast & REFINE_VALUE)
-					value = fast & REFINE_NEGATIVE ? -p1 : p1;
+				value = fast & REFINE_VALUE;
+				negative = fast & REFINE_NEGATIVE;
 			} else {
 				const int rs = huffman_decode(b, t);
 				if (rs < 0)
@@ -485,7 +483,8 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bi
 				if (size) {
 					if (size != 1)
 						return false;
-					value = b.take(1) ? p1 : -p1;
+					value = true;
+					negative = !b.take(1);
 				} else if (run != 15) {
 					st.eobrun = 1u << run;
 					if (run)
@@ -496,25 +495,23 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bi
 			/* Past `run` zeros to the next one (`next`, a single bit), or
 			 * off the band (0); the places passed that are not zeros hold
 			 * corrections. */
-			const uint64_t ahead = in_band & (~0ull << k);
 			const uint64_t next = nth_bit<Ops>(~nonzero & ahead, run);
 			const uint64_t passed = nonzero & ahead & (next - 1);
-			const int at = next ? __builtin_ctzll(next) : s.se + 1;
-			correct<Ops>(b, block, passed, next ? at - k - run : count_bits<Ops>(passed), k, p1, code);
+			correct<Ops>(b, block, kept_mask, passed, count_bits<Ops>(passed), p1, code);
 			if (value) {
 				if (!next)
 					return false;
-				if (at < block.kept)
-					block.coef[at] = int16_t(value);
+				if (next & kept_mask)
+					block.coef[__builtin_ctzll(next)] = int16_t(negative ? -p1 : p1);
 				nonzero |= next;
 			}
-			k = at + 1;
+			ahead &= ~(next | (next - 1));
 		}
 	}
 	if (st.eobrun > 0) {
 		b.fill();
-		const uint64_t rest = nonzero & band(k, s.se);
-		correct<Ops>(b, block, rest, count_bits<Ops>(rest), k, p1, 0);
+		const uint64_t rest = nonzero & ahead;
+		correct<Ops>(b, block, kept_mask, rest, count_bits<Ops>(rest), p1, 0);
 		st.eobrun--;
 	}
 	*block.nonzero = nonzero;
@@ -604,7 +601,8 @@ template <Bit_Ops Ops> Status decode_scan(const Decoder &d, const Scan &s)
 	int ux = 0, uy = 0;
 	while (unit < units) {
 		Scan_State st = {};
-		const uint8_t *seg_end = segment_end(pos, s.end);
+		/* Without restart intervals the scan is one segment, found already. */
+		const uint8_t *seg_end = s.restart_interval ? segment_end(pos, s.end) : s.end;
 		Bits bits(pos, seg_end);
 		const long stop = std::min(units, unit + interval);
 		bool ok;
@@ -956,9 +954,43 @@ void idct_block_vector(const int16_t *coef, const uint16_t *quant, const Idct_Ba
 
 using Idct_Row = void (*)(const int16_t *, const uint16_t *, const Idct_Basis &, const Idct_Basis &, uint8_t *, size_t);
 
+/* One and two samples square, the luma at a quarter and an eighth of the
+ * size: every basis value is +-1/(2 sqrt 2) (or 1/(2 sqrt 2) squared, an
+ * eighth, for the DC), so the samples are sums and differences over 8 in
+ * integers, rounded half up. */
+inline uint8_t eighth_plus_128(int v)
+{
+	const int value = (v + 1028) >> 3;
+	return uint8_t(value < 0 ? 0 : value > 255 ? 255 : value);
+}
+
+void idct_block_1x1(const int16_t *coef, const uint16_t *quant, const Idct_Basis &, const Idct_Basis &, uint8_t *out,
+		    size_t)
+{
+	out[0] = eighth_plus_128(coef[0] * quant[0]);
+}
+
+void idct_block_2x2(const int16_t *coef, const uint16_t *quant, const Idct_Basis &, const Idct_Basis &, uint8_t *out,
+		    size_t stride)
+{
+	/* Zigzag 0, 1, 2, 4: (0, 0), across (0, 1), down (1, 0), (1, 1). */
+	const int dc = coef[0] * quant[0], across = coef[1] * quant[1];
+	const int down = coef[2] * quant[2], both = coef[4] * quant[4];
+	const int top_sum = dc + down, bottom_sum = dc - down;
+	const int top_diff = across + both, bottom_diff = across - both;
+	out[0] = eighth_plus_128(top_sum + top_diff);
+	out[1] = eighth_plus_128(top_sum - top_diff);
+	out[stride] = eighth_plus_128(bottom_sum + bottom_diff);
+	out[stride + 1] = eighth_plus_128(bottom_sum - bottom_diff);
+}
+
 template <int NX, int NY> constexpr Idct_Row idct_of()
 {
-	if constexpr (NX >= 4)
+	if constexpr (NX == 1 && NY == 1)
+		return idct_block_1x1;
+	else if constexpr (NX == 2 && NY == 2)
+		return idct_block_2x2;
+	else if constexpr (NX >= 4)
 		return idct_block_vector<NX, NY>;
 	else
 		return idct_block<NX, NY>;
