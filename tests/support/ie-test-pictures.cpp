@@ -114,9 +114,9 @@ Bytes jpeg_with_segments(const Bytes &jpeg, const std::vector<Bytes> &segments, 
 }
 
 bool write_oriented_jpeg(const std::string &path, int w, int h, int orientation, bool big_endian,
-			 bool comment_first)
+			 bool comment_first, bool progressive)
 {
-	if (!write_picture(path, w, h, "quality=95"))
+	if (!(progressive ? write_progressive_jpeg(path, w, h) : write_picture(path, w, h, "quality=95")))
 		return false;
 	Bytes exif = exif_segment(orientation, big_endian);
 	std::vector<Bytes> segments = comment_first ? std::vector<Bytes>{ comment_segment("Made in a test"), exif }
