@@ -28,6 +28,23 @@ struct Ie_Progressive_Plane {
 	uint16_t quant[64];	    /* zigzag order */
 };
 
+/* Natural (row by row) index of the k-th coefficient in zigzag order. */
+inline constexpr uint8_t IE_JPEG_NATURAL_ORDER[64] = { 0,  1,  8,  16, 9,  2,  3,  10, 17, 24, 32, 25, 18, 11, 4,  5,
+						       12, 19, 26, 33, 40, 48, 41, 34, 27, 20, 13, 6,  7,  14, 21, 28,
+						       35, 42, 49, 56, 57, 50, 43, 36, 29, 22, 15, 23, 30, 37, 44, 51,
+						       58, 59, 52, 45, 38, 31, 39, 46, 53, 60, 61, 54, 47, 55, 62, 63 };
+
+inline size_t ie_progressive_block_index(const Ie_Progressive_Plane &plane, int bx, int by)
+{
+	return size_t(by) * size_t(plane.blocks_w) + size_t(bx);
+}
+
+/* A block's kept coefficients. */
+inline const int16_t *ie_progressive_block(const Ie_Progressive_Plane &plane, int bx, int by)
+{
+	return plane.coefficients + ie_progressive_block_index(plane, bx, by) * size_t(plane.kept);
+}
+
 struct Ie_Progressive {
 	int width, height, components;
 	int hmax, vmax, mcus_x, mcus_y;
@@ -49,7 +66,8 @@ Ie_Progressive_Status ie_progressive_read(const uint8_t *data, size_t size, int 
 void ie_progressive_free(Ie_Progressive *p);
 
 /* The size at the chosen scale, rounded up, and whether every component
- * reaches it without upsampling. */
+ * reaches it without upsampling (ie-image-progressive-pixels.cpp, as the
+ * rendering below). */
 bool ie_progressive_scale_ok(const Ie_Progressive &p, int *w, int *h);
 
 /* Gives the picture at the chosen scale as BGRA rows, top down, in
