@@ -2,14 +2,14 @@
  * come from ie-image-progressive-pixels.cpp); see ie-image-progressive.h.
  * The scans follow the JPEG standard's progressive mode (spectral selection
  * and successive approximation, end-of-band runs, restart intervals); the
- * checks and the order of operations are those that make the
- * coefficients equal libjpeg's on every file it decodes without a warning. Speed comes from the bit
- * reader (eight bytes at a time where no 0xFF needs unstuffing), from
- * Huffman tables that give a short code and the value that follows it in
- * one look-up, and from keeping, beside the few coefficients the reduced
- * inverse DCT reads, only a mask of which coefficients are non-zero: the
- * refinement scans, most of a progressive file, then pass over the
- * correction bits of the others in bulk. */
+ * checks and the order of operations are those that make the coefficients
+ * equal libjpeg's on every file it decodes without a warning. Speed comes
+ * from the bit reader (eight bytes at a time where no 0xFF needs
+ * unstuffing), from Huffman tables that give a short code and the value
+ * that follows it in one look-up, and from keeping, beside the few
+ * coefficients the reduced inverse DCT reads, only a mask of which
+ * coefficients are non-zero: the refinement scans, most of a progressive
+ * file, then pass over the correction bits of the others in bulk. */
 #include "ie-image-progressive.h"
 
 #include <algorithm>
