@@ -135,6 +135,10 @@ TEST_F(MainImageLoad, ReducesToTheBoxAtOnceOrBehindThePopup)
 	};
 	std::string progressive = scratch_path("progressive.jpg");
 	ASSERT_TRUE(write_progressive_jpeg(progressive, 4000, 3000));
+	/* Reduced by less than half: full-size chroma, which our progressive
+	 * decoding leaves to libjpeg. */
+	std::string progressive_double = scratch_path("progressive-double.jpg");
+	ASSERT_TRUE(write_progressive_jpeg(progressive_double, 2000, 1500));
 	/* At once; in the background on the worker (JPEG and PNG, decoded by
 	 * us); in the background in Evas's offscreen canvas (anything else,
 	 * and GIF or WBMP by name), with its decoder's scale-down. */
@@ -153,6 +157,7 @@ TEST_F(MainImageLoad, ReducesToTheBoxAtOnceOrBehindThePopup)
 		{ picture("large.jpg", 4000, 3000), 1280, 960, WORKER, 0, 1 },
 		{ picture("large.png", 4000, 3000), 1280, 960, WORKER, 0, 1 },
 		{ progressive, 1280, 960, WORKER, 0, 1 },
+		{ progressive_double, 1280, 960, AT_ONCE, 0, 1 },
 		{ gif, 1280, 853, OFFSCREEN, 0, 1 },
 		/* Named like a GIF anywhere in the path: treated as one. */
 		{ picture("photo.gif.jpg", 2000, 1500), 1280, 960, OFFSCREEN, 0, 1 },

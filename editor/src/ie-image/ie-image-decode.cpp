@@ -121,6 +121,29 @@ bool jpeg_probe(const uint8_t *data, size_t size, int *w, int *h)
 	return ours;
 }
 
+/* Whether our progressive decoding gives the target without upsampling
+ * chroma: at the scale it will choose (the smallest of 1/8, 2/8, 4/8 and
+ * 8/8 that covers the target), every component's blocks give at most 8
+ * samples a side. Asked before reading the scans, so that a file it would
+ * hand back is not entropy-decoded twice. */
+bool progressive_reachable(const jpeg_decompress_struct &cinfo, int target_w, int target_h)
+{
+	int scale = JPEG_SCALE_DENOM;
+	for (int s : JPEG_SCALES)
+		if ((long(cinfo.image_width) * s + 7) / 8 >= target_w && (long(cinfo.image_height) * s + 7) / 8 >= target_h) {
+			scale = s;
+			break;
+		}
+	for (int c = 0; c < cinfo.num_components; c++) {
+		const jpeg_component_info &comp = cinfo.comp_info[c];
+		if (comp.h_samp_factor <= 0 || comp.v_samp_factor <= 0 ||
+		    scale * cinfo.max_h_samp_factor / comp.h_samp_factor > 8 ||
+		    scale * cinfo.max_v_samp_factor / comp.v_samp_factor > 8)
+			return false;
+	}
+	return true;
+}
+
 /* A progressive JPEG through our own decoder, at the smallest scale that
  * covers the target; NOT_OURS hands it back to libjpeg. */
 enum class Progressive_Result { DONE, FAILED, CANCELLED, NOT_OURS };
@@ -173,7 +196,8 @@ Ie_Decode_Status jpeg_decode(Jpeg_Decode *d, const uint8_t *data, size_t size, i
 	if (!jpeg_ours(d->cinfo))
 		goto done;
 	if (d->cinfo.progressive_mode &&
-	    (d->cinfo.jpeg_color_space == JCS_YCbCr || d->cinfo.jpeg_color_space == JCS_GRAYSCALE)) {
+	    (d->cinfo.jpeg_color_space == JCS_YCbCr || d->cinfo.jpeg_color_space == JCS_GRAYSCALE) &&
+	    progressive_reachable(d->cinfo, target_w, target_h)) {
 		switch (progressive_decode(&d->work, data, size, target_w, target_h, stop, stop_data)) {
 		case Progressive_Result::DONE:
 			*out = { d->work.pixels, target_w, target_h, false };
