@@ -450,43 +450,39 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bi
 		while (ahead) {
 			/* Enough for the code, its bits and most corrections. */
 			b.fill();
-			int run, code = 0;
-			bool value = false, negative = false;
-			const uint16_t fast = t.fast_refine[b.peek(FAST_BITS)];
-			if (fast && !(fast & REFINE_END_OF_BAND)) {
-				code = fast & 31;
-				run = (fast >> 8) & 15;
-				value = fast & REFINE_VALUE;
-				negative = fast & REFINE_NEGATIVE;
-			} else {
+			/* The symbol as the one-look-up table has it: code length,
+			 * run, whether a new coefficient comes and its sign. Long
+			 * codes are decoded into the same form, their bits taken. */
+			uint16_t symbol = t.fast_refine[b.peek(FAST_BITS)];
+			if (!symbol || (symbol & REFINE_END_OF_BAND)) {
 				const int rs = huffman_decode(b, t);
 				if (rs < 0)
 					return false;
-				run = rs >> 4;
-				const int size = rs & 15;
+				const int run = rs >> 4, size = rs & 15;
 				if (size) {
 					if (size != 1)
 						return false;
-					value = true;
-					negative = !b.take(1);
+					symbol = uint16_t(REFINE_VALUE | (b.take(1) ? 0 : REFINE_NEGATIVE) | run << 8);
 				} else if (run != 15) {
 					st.eobrun = 1u << run;
 					if (run)
 						st.eobrun += b.take(run);
 					break;
+				} else {
+					symbol = uint16_t(run << 8);
 				}
 			}
-			/* Past `run` zeros to the next one (`next`, a single bit), or
-			 * off the band (0); the places passed that are not zeros hold
-			 * corrections. */
-			const uint64_t next = nth_bit<Ops>(~nonzero & ahead, run);
+			/* Past the run of zeros to the next one (`next`, a single
+			 * bit), or off the band (0); the places passed that are not
+			 * zeros hold corrections. */
+			const uint64_t next = nth_bit<Ops>(~nonzero & ahead, (symbol >> 8) & 15);
 			const uint64_t passed = nonzero & ahead & (next - 1);
-			correct<Ops>(b, block, kept_mask, passed, count_bits<Ops>(passed), p1, code);
-			if (value) {
+			correct<Ops>(b, block, kept_mask, passed, count_bits<Ops>(passed), p1, symbol & 31);
+			if (symbol & REFINE_VALUE) {
 				if (!next)
 					return false;
 				if (next & kept_mask)
-					block.coef[__builtin_ctzll(next)] = int16_t(negative ? -p1 : p1);
+					block.coef[__builtin_ctzll(next)] = int16_t(symbol & REFINE_NEGATIVE ? -p1 : p1);
 				nonzero |= next;
 			}
 			ahead &= ~(next | (next - 1));
