@@ -1,6 +1,7 @@
-/* Rotation, bilinear resize and sampling, the region copy, and the record
- * checks every routine shares. */
+/* Rotation, bilinear resize and sampling, area reduction, the region copy,
+ * and the record checks every routine shares. */
 #include <algorithm>
+#include <cmath>
 #include <functional>
 
 #include "engine-test-util.h"
@@ -132,6 +133,83 @@ TEST(EngineResize, SingleColumnOrRowRepeatsTheEdge)
 	}
 }
 
+/* Each output pixel is the mean of the area it covers: exact for whole
+ * blocks (rounded half up), within one step of the exact mean otherwise, and
+ * a flat picture stays flat at any ratio. */
+TEST(EngineReduce, MeanOfTheCoveredArea)
+{
+	const uint8_t block[] = {10, 20, 30, 255, 11, 21, 31, 255, 1, 2, 3, 4, 5, 6, 7, 8,
+				 12, 22, 32, 255, 13, 21, 30, 0, 9, 9, 9, 9, 200, 100, 50, 25};
+	const IEL_Image four_by_two = {4, 2, IEL_FORMAT_BGRA8888, const_cast<uint8_t *>(block)};
+	Picture halves(2, 1);
+	ASSERT_EQ(IEL_Reduce_Image(&four_by_two, &halves.record), IEL_OK);
+	EXPECT_EQ(halves.pixels(), std::vector<uint8_t>({12, 21, 31, 191, 54, 29, 17, 12}));
+	EXPECT_TRUE(halves.guard_intact());
+
+	const uint32_t w = 37, h = 29;
+	Picture src = random_picture(w, h, 77);
+	for (const auto &to : {std::pair<uint32_t, uint32_t>{10, 7}, {36, 29}, {1, 29}, {37, 1}, {19, 15}}) {
+		Picture dst(to.first, to.second);
+		ASSERT_EQ(IEL_Reduce_Image(&src.record, &dst.record), IEL_OK);
+		ASSERT_TRUE(dst.guard_intact());
+		const double sx = double(w) / to.first, sy = double(h) / to.second;
+		int worst = 0;
+		for (uint32_t y = 0; y < to.second; y++)
+			for (uint32_t x = 0; x < to.first; x++)
+				for (int c = 0; c < 4; c++) {
+					double sum = 0;
+					for (uint32_t j = 0; j < h; j++)
+						for (uint32_t i = 0; i < w; i++) {
+							const double cover_x = std::max(0.0, std::min(i + 1.0, (x + 1) * sx) - std::max(double(i), x * sx));
+							const double cover_y = std::max(0.0, std::min(j + 1.0, (y + 1) * sy) - std::max(double(j), y * sy));
+							sum += cover_x * cover_y * src.bytes[(j * w + i) * 4 + c];
+						}
+					const double mean = sum / (sx * sy);
+					worst = std::max(worst, int(std::abs(mean - dst.bytes[(y * to.first + x) * 4 + c]) + 0.5));
+				}
+		EXPECT_LE(worst, 1) << to.first << "x" << to.second;
+	}
+
+	Picture flat(23, 17);
+	for (size_t i = 0; i < flat.size; i++)
+		flat.bytes[i] = uint8_t(i % 4 * 60 + 7);
+	for (const auto &to : {std::pair<uint32_t, uint32_t>{7, 5}, {22, 16}, {1, 1}}) {
+		Picture dst(to.first, to.second);
+		ASSERT_EQ(IEL_Reduce_Image(&flat.record, &dst.record), IEL_OK);
+		for (size_t i = 0; i < dst.size; i++)
+			ASSERT_EQ(dst.bytes[i], i % 4 * 60 + 7) << to.first << "x" << to.second << " at " << i;
+	}
+}
+
+/* Fed a row at a time, the reducer writes each output row as soon as its
+ * last source row is in, gives what the whole picture gives, and ignores
+ * rows past the source's height. Larger outputs are refused. */
+TEST(EngineReduce, RowByRowAndRefusals)
+{
+	const uint32_t w = 31, h = 23;
+	Picture src = random_picture(w, h, 5), whole(12, 9), fed(12, 9);
+	ASSERT_EQ(IEL_Reduce_Image(&src.record, &whole.record), IEL_OK);
+	IEL_Reducer *reducer = nullptr;
+	ASSERT_EQ(IEL_Reducer_Create(w, h, &fed.record, &reducer), IEL_OK);
+	for (uint32_t y = 0; y < h; y++) {
+		ASSERT_EQ(IEL_Reducer_Push(reducer, src.data() + y * w * 4, 1), IEL_OK);
+		/* Output row k covers source rows up to (k + 1) x 23 / 9. */
+		const uint32_t done = (y + 1) * 9 / 23;
+		EXPECT_TRUE(std::equal(whole.bytes.begin(), whole.bytes.begin() + done * 12 * 4, fed.bytes.begin())) << y;
+		EXPECT_EQ(fed.bytes[done * 12 * 4], kSentinel) << y;
+	}
+	ASSERT_EQ(IEL_Reducer_Push(reducer, src.data(), h), IEL_OK);
+	IEL_Reducer_Destroy(reducer);
+	EXPECT_TRUE(fed.pixels() == whole.pixels() && fed.guard_intact());
+
+	Picture larger(32, 2);
+	EXPECT_EQ(IEL_Reduce_Image(&src.record, &larger.record), IEL_ERR_INVALID_SIZE);
+	EXPECT_EQ(IEL_Reducer_Create(w, h, &larger.record, &reducer), IEL_ERR_INVALID_SIZE);
+	EXPECT_EQ(reducer, nullptr);
+	EXPECT_TRUE(larger.untouched());
+	EXPECT_EQ(IEL_Reducer_Push(nullptr, src.data(), 1), IEL_ERR_INVALID_PARAM);
+}
+
 TEST(EngineSample, RoundsHalfUpAndReadsOnlyWeightedNeighbours)
 {
 	/* A row of two pixels: at y = 0 the row below is not read. */
@@ -214,6 +292,7 @@ TEST(EngineRecords, EveryRoutineRefusesBadRecords)
 		{"orient", [](auto *s, auto *d) { return IEL_Orient_Image(s, d, 7); }, 1, 1, IEL_OK, 4, 3},
 		{"resize", [](auto *s, auto *d) { return IEL_Resize_Image(s, d); }, 1, 1, 3, -1, 3},
 		{"crop", [](auto *s, auto *d) { return IEL_Crop_Image(s, d, 0, 0); }, 1, 1, 3, 4, 3},
+		{"reduce", [](auto *s, auto *d) { return IEL_Reduce_Image(s, d); }, 1, 1, 3, 4, 3},
 		{"blend", [](auto *s, auto *d) { return IEL_Alpha_blending(s, d, 50); }, 1, 1, 3, 4, 3},
 		{"posterise", [](auto *s, auto *d) { return IEL_Posterize(s, d, 2); }, 1, 1, 3, 4, 3},
 		{"blur", [](auto *s, auto *d) { IEL_RowSumBufInfo info = {nullptr, 0};

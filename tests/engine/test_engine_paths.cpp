@@ -84,6 +84,23 @@ TEST(EnginePaths, FastPathsMatchTheirReference)
 		if (__builtin_cpu_supports("avx512f"))
 			paths.push_back({"avx512 resize", resize(iel_resize_reference), resize(iel_resize_avx512), 2, to});
 	}
+	/* Fed in strips of 1 to 3 rows, as a decoder hands them over. */
+	auto reduce = [](int simd) -> Fill {
+		return [simd](const Input &in, uint8_t *out) {
+			IEL_Reducer *reducer = iel_reducer_new(in.w, in.h, in.to_w, in.to_h, out, simd);
+			ASSERT_NE(reducer, nullptr);
+			for (uint32_t y = 0, strip = 1; y < in.h; y += strip, strip = strip % 3 + 1)
+				iel_reducer_push(reducer, in.src.data() + size_t(y) * in.w * 4, std::min(strip, in.h - y));
+			iel_reducer_free(reducer);
+		};
+	};
+	for (auto to : {+[](uint32_t, uint32_t) { return Size{1, 1}; }, +[](uint32_t w, uint32_t h) { return Size{w, h}; },
+			+[](uint32_t w, uint32_t h) { return Size{(w + 1) / 2, (h + 2) / 3}; },
+			+[](uint32_t w, uint32_t h) { return Size{(2 * w + 2) / 3, h}; },
+			+[](uint32_t w, uint32_t h) { return Size{w, (3 * h + 3) / 4}; }}) {
+		if (kAvx2)
+			paths.push_back({"avx2 reduce", reduce(0), reduce(1), 1, to});
+	}
 	if (kAvx2) {
 		for (uint8_t a : {0, 1, 127, 255}) {
 			auto blend = [a](decltype(&iel_blend_reference) fn) -> Fill {

@@ -133,23 +133,38 @@ TEST_F(MainImageLoad, ReducesToTheBoxAtOnceOrBehindThePopup)
 		EXPECT_TRUE(write_oriented_jpeg(path, w, h, orientation, false, true));
 		return path;
 	};
+	std::string progressive = scratch_path("progressive.jpg");
+	ASSERT_TRUE(write_progressive_jpeg(progressive, 4000, 3000));
+	/* Reduced by less than half: full-size chroma, which our progressive
+	 * decoding leaves to libjpeg. */
+	std::string progressive_double = scratch_path("progressive-double.jpg");
+	ASSERT_TRUE(write_progressive_jpeg(progressive_double, 2000, 1500));
+	/* At once; in the background on the worker (JPEG and PNG, decoded by
+	 * us); in the background in Evas's offscreen canvas (anything else,
+	 * and GIF or WBMP by name), with its decoder's scale-down. */
+	enum Way { AT_ONCE, WORKER, OFFSCREEN };
 	struct Case {
 		std::string path;
 		int w, h;
-		int scale_down; /* of the background load; -1 for at once */
+		Way way;
+		int scale_down;
 		int orientation;
 	} cases[] = {
-		{ picture("small.jpg", 640, 480), 640, 480, -1, 1 },
-		{ picture("double.jpg", 2000, 1500), 1280, 960, -1, 1 },
-		{ picture("triple.jpg", 3000, 2000), 1280, 853, -1, 1 },
-		{ picture("large.jpg", 4000, 3000), 1280, 960, 3, 1 },
-		{ gif, 1280, 853, 0, 1 },
+		{ picture("small.jpg", 640, 480), 640, 480, AT_ONCE, 0, 1 },
+		{ picture("double.jpg", 2000, 1500), 1280, 960, AT_ONCE, 0, 1 },
+		{ picture("triple.jpg", 3000, 2000), 1280, 853, AT_ONCE, 0, 1 },
+		{ picture("triple.png", 3000, 2000), 1280, 853, AT_ONCE, 0, 1 },
+		{ picture("large.jpg", 4000, 3000), 1280, 960, WORKER, 0, 1 },
+		{ picture("large.png", 4000, 3000), 1280, 960, WORKER, 0, 1 },
+		{ progressive, 1280, 960, WORKER, 0, 1 },
+		{ progressive_double, 1280, 960, AT_ONCE, 0, 1 },
+		{ gif, 1280, 853, OFFSCREEN, 0, 1 },
 		/* Named like a GIF anywhere in the path: treated as one. */
-		{ picture("photo.gif.jpg", 2000, 1500), 1280, 960, 0, 1 },
-		{ turned(640, 480, 6), 480, 640, -1, 6 },
-		{ turned(640, 480, 8), 480, 640, -1, 8 },
-		{ turned(2000, 1500, 6), 960, 1280, -1, 6 },
-		{ turned(4000, 3000, 8), 960, 1280, 3, 8 },
+		{ picture("photo.gif.jpg", 2000, 1500), 1280, 960, OFFSCREEN, 0, 1 },
+		{ turned(640, 480, 6), 480, 640, AT_ONCE, 0, 6 },
+		{ turned(640, 480, 8), 480, 640, AT_ONCE, 0, 8 },
+		{ turned(2000, 1500, 6), 960, 1280, AT_ONCE, 0, 6 },
+		{ turned(4000, 3000, 8), 960, 1280, WORKER, 0, 8 },
 	};
 	int popups_deleted = 0;
 	for (const Case &c : cases) {
@@ -161,18 +176,21 @@ TEST_F(MainImageLoad, ReducesToTheBoxAtOnceOrBehindThePopup)
 		/* Laid out at its final size, pixels or not. */
 		evas_smart_objects_calculate(evas());
 		EXPECT_EQ(shown().w, 720);
-		if (c.scale_down < 0) {
-			EXPECT_EQ(sd()->preload_image, nullptr);
+		EXPECT_EQ(sd()->decode_job != nullptr, c.way == WORKER);
+		EXPECT_EQ(sd()->preload_image != nullptr, c.way == OFFSCREEN);
+		if (c.way == OFFSCREEN) {
+			EXPECT_EQ(evas_object_image_load_scale_down_get(sd()->preload_image), c.scale_down);
+		}
+		if (c.way == AT_ONCE) {
 			EXPECT_EQ(sd()->processing_popup, nullptr);
 		} else {
-			ASSERT_NE(sd()->preload_image, nullptr);
-			EXPECT_EQ(evas_object_image_load_scale_down_get(sd()->preload_image), c.scale_down);
-			EXPECT_EQ(pixel_size().w, 0) << "no pixels before the preload completes";
+			EXPECT_EQ(pixel_size().w, 0) << "no pixels before the background load completes";
 			ASSERT_NE(sd()->processing_popup, nullptr);
 			EXPECT_TRUE(evas_object_visible_get(sd()->processing_popup));
 			evas_object_event_callback_add(sd()->processing_popup, EVAS_CALLBACK_DEL, count_del, &popups_deleted);
 			ASSERT_TRUE(wait_for_pixels());
 			EXPECT_EQ(popups_deleted, 1);
+			EXPECT_EQ(sd()->decode_job, nullptr);
 			popups_deleted = 0;
 		}
 		EXPECT_EQ(pixel_size(), (Rect{ 0, 0, c.w, c.h }));
@@ -190,45 +208,49 @@ TEST_F(MainImageLoad, ReducesToTheBoxAtOnceOrBehindThePopup)
 }
 
 /* The picture on screen is the stored picture turned as its EXIF block
- * says, wherever the block sits and in either byte order: pixel for pixel
- * when shown as is, cell for cell when reduced. */
+ * says, wherever the block sits and in either byte order, baseline or
+ * progressive: pixel for pixel when shown as is, cell for cell when
+ * reduced. */
 TEST_F(MainImageLoad, EveryOrientationShowsUprightOnEveryWayIn)
 {
 	for (const Way_In &way : WAYS_IN)
 		for (int orientation = 1; orientation <= 8; orientation++)
-			for (bool comment_first : { false, true })
-				for (bool big_endian : { false, true }) {
-					std::string name = std::string(way.name) + "-" + std::to_string(orientation) +
-							   (comment_first ? "-comment" : "") + (big_endian ? "-mm" : "-ii") + ".jpg";
-					SCOPED_TRACE(name);
-					std::string path = scratch_path(name);
-					ASSERT_TRUE(write_oriented_jpeg(path, way.w, way.h, orientation, big_endian, comment_first));
-					ASSERT_TRUE(load(path, SMALL_BOX, SMALL_BOX));
-					if (way.background) {
-						ASSERT_TRUE(wait_for_pixels());
-					}
+			for (int variant = 0; variant < 5; variant++) {
+				/* Each place and byte order of the block, then a
+				 * progressive file (our own decoder's way in). */
+				const bool comment_first = variant & 1, big_endian = variant & 2, progressive = variant == 4;
+				std::string name = std::string(way.name) + "-" + std::to_string(orientation) +
+						   (comment_first ? "-comment" : "") + (big_endian ? "-mm" : "-ii") +
+						   (progressive ? "-progressive" : "") + ".jpg";
+				SCOPED_TRACE(name);
+				std::string path = scratch_path(name);
+				ASSERT_TRUE(write_oriented_jpeg(path, way.w, way.h, orientation, big_endian, comment_first, progressive));
+				ASSERT_TRUE(load(path, SMALL_BOX, SMALL_BOX));
+				if (way.background) {
+					ASSERT_TRUE(wait_for_pixels());
+				}
 
-					Pixels stored = stored_pixels(path);
-					Pixels shown = image_pixels(ie_image_object_get(obj_));
-					EXPECT_EQ(sd()->img_w, shown.w);
-					EXPECT_EQ(sd()->img_h, shown.h);
-					if (!way.reduced) {
-						EXPECT_TRUE(shown == turned_upright(stored, orientation));
-						continue;
-					}
-					EXPECT_EQ(shown.w, orientation >= 5 ? 75 : 100);
-					EXPECT_EQ(shown.h, orientation >= 5 ? 100 : 75);
-					/* Reducing blurs the marked corner a little; any other
-					 * orientation differs by far more. */
-					for (int other = 1; other <= 8; other++) {
-						int difference = grid_difference(shown, turned_upright(stored, other));
-						if (other == orientation) {
-							EXPECT_LE(difference, 24);
-						} else if ((other >= 5) == (orientation >= 5)) {
-							EXPECT_GT(difference, 96) << other;
-						}
+				Pixels stored = stored_pixels(path);
+				Pixels shown = image_pixels(ie_image_object_get(obj_));
+				EXPECT_EQ(sd()->img_w, shown.w);
+				EXPECT_EQ(sd()->img_h, shown.h);
+				if (!way.reduced) {
+					EXPECT_TRUE(shown == turned_upright(stored, orientation));
+					continue;
+				}
+				EXPECT_EQ(shown.w, orientation >= 5 ? 75 : 100);
+				EXPECT_EQ(shown.h, orientation >= 5 ? 100 : 75);
+				/* Reducing blurs the marked corner a little; any other
+				 * orientation differs by far more. */
+				for (int other = 1; other <= 8; other++) {
+					int difference = grid_difference(shown, turned_upright(stored, other));
+					if (other == orientation) {
+						EXPECT_LE(difference, 24);
+					} else if ((other >= 5) == (orientation >= 5)) {
+						EXPECT_GT(difference, 96) << other;
 					}
 				}
+			}
 }
 
 /* A JPEG or PNG cut anywhere fails as any unreadable file does, whichever

@@ -3,6 +3,10 @@
 #include <Ecore_Evas.h>
 #include <libexif/exif-data.h>
 
+#include <cstdio>
+
+#include <jpeglib.h>
+
 #include <algorithm>
 #include <array>
 #include <cstdlib>
@@ -110,14 +114,46 @@ Bytes jpeg_with_segments(const Bytes &jpeg, const std::vector<Bytes> &segments, 
 }
 
 bool write_oriented_jpeg(const std::string &path, int w, int h, int orientation, bool big_endian,
-			 bool comment_first)
+			 bool comment_first, bool progressive)
 {
-	if (!write_picture(path, w, h, "quality=95"))
+	if (!(progressive ? write_progressive_jpeg(path, w, h) : write_picture(path, w, h, "quality=95")))
 		return false;
 	Bytes exif = exif_segment(orientation, big_endian);
 	std::vector<Bytes> segments = comment_first ? std::vector<Bytes>{ comment_segment("Made in a test"), exif }
 						    : std::vector<Bytes>{ exif };
 	return write_bytes(path, jpeg_with_segments(read_bytes(path), segments, comment_first));
+}
+
+bool write_progressive_jpeg(const std::string &path, int w, int h)
+{
+	const std::string plain = path + ".png";
+	if (!write_picture(plain, w, h))
+		return false;
+	const Pixels pixels = stored_pixels(plain);
+	std::remove(plain.c_str());
+	FILE *file = pixels.data.empty() ? nullptr : fopen(path.c_str(), "wb");
+	if (!file)
+		return false;
+	jpeg_compress_struct cinfo;
+	jpeg_error_mgr error;
+	cinfo.err = jpeg_std_error(&error);
+	jpeg_create_compress(&cinfo);
+	jpeg_stdio_dest(&cinfo, file);
+	cinfo.image_width = JDIMENSION(w);
+	cinfo.image_height = JDIMENSION(h);
+	cinfo.input_components = 4;
+	cinfo.in_color_space = JCS_EXT_BGRX;
+	jpeg_set_defaults(&cinfo);
+	jpeg_set_quality(&cinfo, 95, TRUE);
+	jpeg_simple_progression(&cinfo);
+	jpeg_start_compress(&cinfo, TRUE);
+	while (cinfo.next_scanline < cinfo.image_height) {
+		auto *row = reinterpret_cast<JSAMPLE *>(const_cast<uint32_t *>(&pixels.data[size_t(cinfo.next_scanline) * w]));
+		jpeg_write_scanlines(&cinfo, &row, 1);
+	}
+	jpeg_finish_compress(&cinfo);
+	jpeg_destroy_compress(&cinfo);
+	return fclose(file) == 0;
 }
 
 bool write_png_with_short_data(const std::string &path, int w, int h)

@@ -28,9 +28,12 @@ Bytes jpeg_with_segments(const Bytes &jpeg, const std::vector<Bytes> &segments, 
 
 /* write_picture's w x h JPEG stored in `orientation`: the EXIF block comes
  * first, or (`comment_first`) after the JFIF segment and a comment, the way
- * common image editors write it. */
+ * common image editors write it; baseline or progressive. */
 bool write_oriented_jpeg(const std::string &path, int w, int h, int orientation, bool big_endian,
-			 bool comment_first);
+			 bool comment_first, bool progressive = false);
+
+/* write_picture's w x h picture as a progressive JPEG (quality 95). */
+bool write_progressive_jpeg(const std::string &path, int w, int h);
 
 /* write_picture's PNG with only the first half of its compressed image
  * data, in chunks that are whole and correct: nothing shows the damage

@@ -1,7 +1,11 @@
-/* Size rule and processor check shared by the engine's routines. */
+/* Size rule, processor check and thread count shared by the engine's
+ * routines. */
 #include <stdint.h>
 #include <stdlib.h>
 #include <string.h>
+
+#include <atomic>
+#include <thread>
 
 #include "ie-engine-private.h"
 
@@ -48,4 +52,34 @@ int iel_cpu_has_avx512(void)
 		return __builtin_cpu_supports("avx512f") ? 1 : 0;
 	}();
 	return has_avx512;
+}
+
+namespace {
+
+std::atomic<int> chosen_thread_count{ 0 };
+
+int default_thread_count()
+{
+	static const int count = [] {
+		const char *value = getenv("IEL_THREADS");
+		const int asked = value ? atoi(value) : 0;
+		if (asked > 0)
+			return asked;
+		const unsigned cores = std::thread::hardware_concurrency();
+		return cores > 0 ? int(cores) : 1;
+	}();
+	return count;
+}
+
+}
+
+int iel_thread_count(void)
+{
+	const int chosen = chosen_thread_count.load(std::memory_order_relaxed);
+	return chosen > 0 ? chosen : default_thread_count();
+}
+
+void iel_thread_count_set(int count)
+{
+	chosen_thread_count.store(count > 0 ? count : 0, std::memory_order_relaxed);
 }

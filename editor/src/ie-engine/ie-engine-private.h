@@ -44,6 +44,12 @@ size_t iel_byte_count(uint32_t width, uint32_t height, unsigned bytes_per_pixel,
 int iel_cpu_has_avx2(void);
 int iel_cpu_has_avx512(void);
 
+/* How many threads a routine may split its work over, where the result is
+ * the same whatever the count: the processor's cores, IEL_THREADS=N in the
+ * environment, or what iel_thread_count_set gave (0 restores the default). */
+int iel_thread_count(void);
+void iel_thread_count_set(int count);
+
 /* Rotation: pixel loops without checks. */
 void iel_rotate_reference(const uint8_t *src, uint8_t *dst, uint32_t width, uint32_t height,
 			  int bytes_per_pixel, unsigned int rotation);
@@ -66,6 +72,18 @@ void iel_resize_avx2(const uint8_t *src, uint32_t src_width, uint32_t src_height
 		     uint8_t *dst, uint32_t dst_width, uint32_t dst_height);
 void iel_resize_avx512(const uint8_t *src, uint32_t src_width, uint32_t src_height,
 		       uint8_t *dst, uint32_t dst_width, uint32_t dst_height);
+
+/* Area reduction: the reducer on the reference kernels (simd 0) or the
+ * AVX2 ones, and those kernels. Gather: sums[i] (+)= weight x row[i] over
+ * `count` bytes, set when `start`. Emit: one output row from its sums. */
+IEL_Reducer *iel_reducer_new(uint32_t src_w, uint32_t src_h, uint32_t dst_w, uint32_t dst_h, uint8_t *dst,
+			     int simd);
+void iel_reducer_push(IEL_Reducer *reducer, const uint8_t *rows, uint32_t count);
+void iel_reducer_free(IEL_Reducer *reducer);
+void iel_reduce_gather_reference(uint32_t *sums, const uint8_t *row, size_t count, uint32_t weight, int start);
+void iel_reduce_gather_avx2(uint32_t *sums, const uint8_t *row, size_t count, uint32_t weight, int start);
+void iel_reduce_emit_reference(const IEL_Reducer *reducer, const uint32_t *sums, uint16_t *narrowed, uint8_t *out);
+void iel_reduce_emit_avx2(const IEL_Reducer *reducer, const uint32_t *sums, uint16_t *narrowed, uint8_t *out);
 
 /* Blend of `count` bytes, alpha bytes (every fourth from index 3) kept. */
 void iel_blend_reference(const uint8_t *effect, uint8_t *inout, size_t count, uint8_t a);

@@ -57,6 +57,13 @@ int IEL_Rotate_Image(const IEL_Image *src, IEL_Image *dst, unsigned int rotation
 /* The upright picture from one stored in EXIF orientation 1 to 8. */
 int IEL_Orient_Image(const IEL_Image *src, IEL_Image *dst, unsigned int orientation);
 int IEL_Resize_Image(const IEL_Image *src, IEL_Image *dst);
+/* Area-average reduction of a BGRA picture to a size no larger on either
+ * side; the reducer takes the source's rows as they come, top down. */
+typedef struct IEL_Reducer IEL_Reducer;
+int IEL_Reduce_Image(const IEL_Image *src, IEL_Image *dst);
+int IEL_Reducer_Create(uint32_t src_width, uint32_t src_height, IEL_Image *dst, IEL_Reducer **reducer);
+int IEL_Reducer_Push(IEL_Reducer *reducer, const uint8_t *rows, uint32_t count);
+void IEL_Reducer_Destroy(IEL_Reducer *reducer);
 uint32_t IEL_Bilinear_Sample(double x, double y, const uint32_t *src, int width);
 int IEL_Alpha_blending(const IEL_Image *effect, IEL_Image *inout, float alpha);
 int IEL_Variable_Blur_BGRA888_skip(const IEL_Image *src, IEL_Image *dst, IEL_RowSumBufInfo *info,

@@ -1,11 +1,14 @@
 /* Puts the picture into the main image object. A picture with more pixels
  * than the host's box is reduced so that its long side equals the box's
- * longer side: small reductions at once (decoder scale-down, then a
- * bilinear resample), large ones and GIF/WBMP in an offscreen buffer canvas
- * preloaded in the background while a processing popup shows. The EXIF
- * orientation is read from the file by us and applied to the pixels by us
- * on every path, as they go into the image: Evas's own reading misses a
- * block that another segment precedes. */
+ * longer side: small reductions at once, large ones in the background
+ * while a processing popup shows. JPEG and PNG are reduced by our own
+ * decoding (the decoder's scale-down, then an area average), on a worker
+ * thread when in the background; other formats, and GIF/WBMP by name, by
+ * Evas (scale-down then a bilinear resample at once, an offscreen buffer
+ * canvas preloaded in the background). The EXIF orientation is read from
+ * the file by us and applied to the pixels by us on every path, as they go
+ * into the image: Evas's own reading misses a block that another segment
+ * precedes. */
 #include <Ecore_Evas.h>
 #include <Elementary.h>
 
@@ -20,6 +23,7 @@
 
 #include "editor-svc-private.h"
 #include "ie-engine.h"
+#include "ie-image-decode.h"
 #include "ie-image-private.h"
 #include "ie-image-source.h"
 
@@ -43,6 +47,7 @@ struct Load_Plan {
 	int scale_down; /* decoder scale-down factor, 0 for none */
 	int target_w, target_h; /* as shown upright */
 	int orientation;	/* EXIF, of the stored pixels */
+	bool ours;		/* reduced by our own decoding, not by Evas */
 };
 
 /* EXIF orientation 1 stores the picture upright; 5 to 8 store it a quarter
@@ -74,11 +79,37 @@ void turned_size(int orientation, int w, int h, int *turned_w, int *turned_h)
 	*turned_h = turned ? w : h;
 }
 
+/* The file's bytes, mapped for as long as the load needs them. */
+struct File_Map {
+	Eina_File *file;
+	const uint8_t *data;
+	size_t size;
+	explicit File_Map(Eina_File *f)
+		: file(f), data(static_cast<const uint8_t *>(eina_file_map_all(f, EINA_FILE_SEQUENTIAL))),
+		  size(eina_file_size_get(f))
+	{
+	}
+	~File_Map()
+	{
+		if (data)
+			eina_file_map_free(file, const_cast<uint8_t *>(data));
+	}
+	File_Map(const File_Map &) = delete;
+	File_Map &operator=(const File_Map &) = delete;
+};
+
 } // namespace
 
 static void _print_image_load_err(Evas_Load_Error error)
 {
 	IE_LOG_E("could not load image. error string is \"%s\"\n", evas_load_error_str(error));
+}
+
+/* A plain substring test anywhere in the path. */
+static bool _named_like_gif_or_wbmp(const char *path)
+{
+	return std::any_of(std::begin(ASYNC_FORMAT_MARKS), std::end(ASYNC_FORMAT_MARKS),
+			   [path](const char *mark) { return strstr(path, mark) != NULL; });
 }
 
 /* Chooses how a picture of iw x ih goes into a box of box_w x box_h. Sizes
@@ -90,7 +121,7 @@ static bool _load_plan_get(const char *path, int iw, int ih, int box_w, int box_
 		return false;
 
 	if ((int64_t)iw * ih <= (int64_t)box_w * box_h) {
-		*plan = { Load_Path::FULL_SIZE, 0, iw, ih, UPRIGHT };
+		*plan = { Load_Path::FULL_SIZE, 0, iw, ih, UPRIGHT, false };
 		return true;
 	}
 
@@ -116,9 +147,7 @@ static bool _load_plan_get(const char *path, int iw, int ih, int box_w, int box_
 	plan->target_w = (int)tw;
 	plan->target_h = (int)th;
 
-	bool async_format = std::any_of(std::begin(ASYNC_FORMAT_MARKS), std::end(ASYNC_FORMAT_MARKS),
-					[path](const char *mark) { return strstr(path, mark) != NULL; });
-	if (async_format) {
+	if (_named_like_gif_or_wbmp(path)) {
 		plan->path = Load_Path::ASYNC;
 		plan->scale_down = 0;
 	} else if (r <= 2 * longest) {
@@ -195,9 +224,26 @@ static bool _image_pixels_put(Mainimg_Smart_Data *sd, const void *pixels, int w,
 	return ie_image_pixels_take(sd->obj, upright.release(), upright_w, upright_h);
 }
 
+/* An image that has read the file's header, or NULL (the error logged). */
+static Evas_Object_Ptr _probe_open(Evas_Object *obj, const Ie_Image_Source &source)
+{
+	Evas_Object_Ptr probe(evas_object_image_add(evas_object_evas_get(obj)));
+	if (!probe) {
+		IE_LOG_E("Cannot create probe image");
+		return probe;
+	}
+	_image_source_set(probe.get(), source);
+	Evas_Load_Error error = evas_object_image_load_error_get(probe.get());
+	if (error != EVAS_LOAD_ERROR_NONE) {
+		_print_image_load_err(error);
+		probe.reset();
+	}
+	return probe;
+}
+
 /* Upright as stored: the image keeps the file and decodes it in place.
- * Otherwise the probe decodes it and the turn puts it into the image. */
-static bool _load_full_size(Mainimg_Smart_Data *sd, Evas_Object *probe, const Ie_Image_Source &source,
+ * Otherwise a probe decodes it and the turn puts it into the image. */
+static bool _load_full_size(Mainimg_Smart_Data *sd, Evas_Object_Ptr probe, const Ie_Image_Source &source,
 			    const Load_Plan &plan)
 {
 	if (plan.orientation == UPRIGHT) {
@@ -210,11 +256,15 @@ static bool _load_full_size(Mainimg_Smart_Data *sd, Evas_Object *probe, const Ie
 		/* Read-only access ends here; Evas keeps the decoded pixels. */
 		evas_object_image_data_set(sd->image, const_cast<void *>(pixels));
 	} else {
-		const void *pixels = _image_pixels_decode(probe);
+		if (!probe)
+			probe = _probe_open(sd->obj, source);
+		if (!probe)
+			return false;
+		const void *pixels = _image_pixels_decode(probe.get());
 		int sw = 0, sh = 0;
-		evas_object_image_size_get(probe, &sw, &sh);
+		evas_object_image_size_get(probe.get(), &sw, &sh);
 		if (!pixels || !_image_pixels_put(sd, pixels, sw, sh, plan.orientation,
-						  evas_object_image_alpha_get(probe)))
+						  evas_object_image_alpha_get(probe.get())))
 			return false;
 	}
 	sd->img_w = plan.target_w;
@@ -264,6 +314,31 @@ static bool _load_resampled(Mainimg_Smart_Data *sd, const Ie_Image_Source &sourc
 	 * the full-size file over them. */
 	if (!_image_pixels_put(sd, buf.get(), stored_w, stored_h, plan.orientation,
 			       evas_object_image_alpha_get(image)))
+		return false;
+	sd->img_w = plan.target_w;
+	sd->img_h = plan.target_h;
+	return true;
+}
+
+/* Our decoding's pixels, as stored, turned upright into the image. */
+static bool _decoded_put(Mainimg_Smart_Data *sd, Ie_Decode_Status status, const Ie_Decoded &decoded)
+{
+	if (status != Ie_Decode_Status::DONE) {
+		_print_image_load_err(EVAS_LOAD_ERROR_CORRUPT_FILE);
+		return false;
+	}
+	return _image_pixels_put(sd, decoded.pixels, decoded.w, decoded.h, sd->orientation, decoded.alpha);
+}
+
+static bool _load_decoded_now(Mainimg_Smart_Data *sd, const File_Map &map, const Load_Plan &plan)
+{
+	int stored_w, stored_h;
+	turned_size(plan.orientation, plan.target_w, plan.target_h, &stored_w, &stored_h);
+	Ie_Decoded decoded;
+	Ie_Decode_Status status = ie_image_decode(map.data, map.size, stored_w, stored_h, NULL, NULL, &decoded);
+	std::unique_ptr<uint8_t, Free_Deleter> pixels(decoded.pixels);
+	sd->orientation = plan.orientation;
+	if (!_decoded_put(sd, status, decoded))
 		return false;
 	sd->img_w = plan.target_w;
 	sd->img_h = plan.target_h;
@@ -334,12 +409,43 @@ void _processing_popup_del(Mainimg_Smart_Data *sd)
 
 static void _on_image_preloaded(void *data, Evas *e, Evas_Object *preload_image, void *event_info);
 
+/* A decoding on the worker thread. The job belongs to the thread's
+ * callbacks, which free it; the main image only points at it and lets go
+ * by clearing `owner`. */
+struct Decode_Job {
+	Eina_File *file;
+	int target_w, target_h; /* as stored */
+	Evas_Object *owner;	/* the main image, NULL once it no longer waits */
+	Ie_Decode_Status status;
+	Ie_Decoded decoded;
+};
+
+static void _decode_job_free(Decode_Job *job)
+{
+	free(job->decoded.pixels);
+	eina_file_close(job->file);
+	delete job;
+}
+
+static void _decode_job_detach(Mainimg_Smart_Data *sd)
+{
+	if (!sd->decode_job)
+		return;
+	sd->decode_job->owner = NULL;
+	Ecore_Thread *thread = sd->decode_thread;
+	sd->decode_job = NULL;
+	sd->decode_thread = NULL;
+	/* May free the job at once, if it has not started. */
+	ecore_thread_cancel(thread);
+}
+
 void _preload_release(Mainimg_Smart_Data *sd)
 {
 	if (sd->load_failed_job) {
 		ecore_job_del(sd->load_failed_job);
 		sd->load_failed_job = NULL;
 	}
+	_decode_job_detach(sd);
 	if (!sd->preload_image)
 		return;
 	Evas_Object *preload_image = sd->preload_image;
@@ -367,6 +473,102 @@ static void _load_failed_job_cb(void *data)
 		return;
 	sd->load_failed_job = NULL;
 	evas_object_smart_callback_call(sd->obj, IE_IMAGE_SIGNAL_LOAD_FAILED, NULL);
+}
+
+/* What the background load came to, on the main loop: the popup goes
+ * down, and a failure is reported once the caller's work is over. */
+static void _background_load_done(Mainimg_Smart_Data *sd, bool failed)
+{
+	if (sd->processing_popup)
+		_processing_popup_del(sd);
+	else
+		sd->preloaded = EINA_TRUE;
+	if (sd->preload_starting) {
+		sd->preload_failed = failed;
+		return;
+	}
+	if (failed && !sd->load_failed_job)
+		sd->load_failed_job = ecore_job_add(_load_failed_job_cb, sd->obj);
+}
+
+/* On the worker thread: only the job and the file's bytes are touched. */
+static void _decode_job_run(void *data, Ecore_Thread *thread)
+{
+	auto *job = static_cast<Decode_Job *>(data);
+	job->status = Ie_Decode_Status::FAILED;
+	/* Mapped whole at once: the decoder reads it all, in order. */
+	void *bytes = eina_file_map_all(job->file, EINA_FILE_POPULATE);
+	if (!bytes)
+		return;
+	auto stop = [](void *t) -> bool { return ecore_thread_check(static_cast<Ecore_Thread *>(t)); };
+	job->status = ie_image_decode(static_cast<const uint8_t *>(bytes), eina_file_size_get(job->file), job->target_w,
+				      job->target_h, stop, thread, &job->decoded);
+	eina_file_map_free(job->file, bytes);
+}
+
+static Mainimg_Smart_Data *_decode_job_owner(Decode_Job *job)
+{
+	Mainimg_Smart_Data *sd = job->owner ? _mainimg_data_get(job->owner) : NULL;
+	if (!sd || sd->decode_job != job)
+		return NULL;
+	sd->decode_job = NULL;
+	sd->decode_thread = NULL;
+	return sd;
+}
+
+static void _decode_job_end(void *data, Ecore_Thread *thread)
+{
+	(void)thread;
+	auto *job = static_cast<Decode_Job *>(data);
+	Mainimg_Smart_Data *sd = _decode_job_owner(job);
+	if (sd)
+		_background_load_done(sd, !_decoded_put(sd, job->status, job->decoded));
+	_decode_job_free(job);
+}
+
+/* Cancelled by us (no owner any more), or by Ecore when the thread could
+ * not run: then the load has failed. */
+static void _decode_job_cancel(void *data, Ecore_Thread *thread)
+{
+	(void)thread;
+	auto *job = static_cast<Decode_Job *>(data);
+	Mainimg_Smart_Data *sd = _decode_job_owner(job);
+	if (sd) {
+		IE_LOG_E("Cannot decode the picture in the background");
+		_background_load_done(sd, true);
+	}
+	_decode_job_free(job);
+}
+
+static bool _load_decoded_in_background(Mainimg_Smart_Data *sd, const Ie_Image_Source &source, const Load_Plan &plan)
+{
+	auto *job = new (std::nothrow) Decode_Job();
+	if (!job) {
+		IE_LOG_E("Cannot create the decoding job");
+		return false;
+	}
+	turned_size(plan.orientation, plan.target_w, plan.target_h, &job->target_w, &job->target_h);
+	job->file = eina_file_dup(source.file);
+	job->owner = sd->obj;
+	sd->preloaded = EINA_FALSE;
+	sd->orientation = plan.orientation;
+	sd->decode_job = job;
+
+	sd->preload_starting = EINA_TRUE;
+	sd->preload_failed = EINA_FALSE;
+	Ecore_Thread *thread = ecore_thread_run(_decode_job_run, _decode_job_end, _decode_job_cancel, job);
+	sd->preload_starting = EINA_FALSE;
+	/* Ecore may have given up on the job (and freed it) already. */
+	if (sd->decode_job)
+		sd->decode_thread = thread;
+	if (sd->preload_failed)
+		return false;
+	if (!sd->preloaded)
+		sd->processing_popup = _processing_popup_create(sd);
+
+	sd->img_w = plan.target_w;
+	sd->img_h = plan.target_h;
+	return true;
 }
 
 static void _on_image_preloaded(void *data, Evas *e, Evas_Object *preload_image, void *event_info)
@@ -399,20 +601,11 @@ static void _on_image_preloaded(void *data, Evas *e, Evas_Object *preload_image,
 		}
 	}
 
-	if (sd->processing_popup)
-		_processing_popup_del(sd);
-	else
-		sd->preloaded = EINA_TRUE;
-
 	/* Reported from inside evas_object_image_preload: the load has not
 	 * returned yet, so it drops the file and reports any failure itself. */
-	if (sd->preload_starting) {
-		sd->preload_failed = failed;
-		return;
-	}
-	_preload_image_drop_file(preload_image);
-	if (failed && !sd->load_failed_job)
-		sd->load_failed_job = ecore_job_add(_load_failed_job_cb, sd->obj);
+	if (!sd->preload_starting)
+		_preload_image_drop_file(preload_image);
+	_background_load_done(sd, failed);
 }
 
 /* The offscreen canvas renders the picture as stored, at the target size;
@@ -493,21 +686,21 @@ Eina_Bool ie_image_file_load(Evas_Object *obj, const char *path, int width, int 
 		return EINA_FALSE;
 	Source_Closer source_closer{ &source };
 
-	Evas_Object_Ptr probe(evas_object_image_add(evas_object_evas_get(obj)));
-	if (!probe) {
-		IE_LOG_E("Cannot create probe image");
-		return EINA_FALSE;
-	}
-	_image_source_set(probe.get(), source);
-	Evas_Load_Error error = evas_object_image_load_error_get(probe.get());
-	if (error != EVAS_LOAD_ERROR_NONE) {
-		_print_image_load_err(error);
-		return EINA_FALSE;
+	/* Our decoder reads the header of the files it takes; Evas reads the
+	 * others', and is then the one to decode them. */
+	File_Map map(source.file);
+	int sw = 0, sh = 0;
+	const bool decodable = map.data && ie_image_decode_probe(map.data, map.size, &sw, &sh);
+	Evas_Object_Ptr probe;
+	if (!decodable) {
+		probe = _probe_open(obj, source);
+		if (!probe)
+			return EINA_FALSE;
+		evas_object_image_size_get(probe.get(), &sw, &sh);
 	}
 
 	/* Sizes and steps go by the picture as shown upright. */
-	int sw = 0, sh = 0, iw, ih;
-	evas_object_image_size_get(probe.get(), &sw, &sh);
+	int iw, ih;
 	turned_size(source.orientation, sw, sh, &iw, &ih);
 	Load_Plan plan = {};
 	if (!_load_plan_get(path, iw, ih, width, height, &plan)) {
@@ -515,17 +708,22 @@ Eina_Bool ie_image_file_load(Evas_Object *obj, const char *path, int width, int 
 		return EINA_FALSE;
 	}
 	plan.orientation = source.orientation;
+	/* Ours only reduces; a box larger than the picture on a side (it has
+	 * more pixels all the same) is left to Evas's resampling. */
+	plan.ours = decodable && plan.path != Load_Path::FULL_SIZE && !_named_like_gif_or_wbmp(path) &&
+		    std::max(plan.target_w, plan.target_h) <= std::max(iw, ih) &&
+		    std::min(plan.target_w, plan.target_h) <= std::min(iw, ih);
 
 	bool ok = false;
 	switch (plan.path) {
 	case Load_Path::FULL_SIZE:
-		ok = _load_full_size(sd, probe.get(), source, plan);
+		ok = _load_full_size(sd, std::move(probe), source, plan);
 		break;
 	case Load_Path::RESAMPLED:
-		ok = _load_resampled(sd, source, plan);
+		ok = plan.ours ? _load_decoded_now(sd, map, plan) : _load_resampled(sd, source, plan);
 		break;
 	case Load_Path::ASYNC:
-		ok = _load_async(sd, source, plan);
+		ok = plan.ours ? _load_decoded_in_background(sd, source, plan) : _load_async(sd, source, plan);
 		break;
 	}
 	if (!ok)

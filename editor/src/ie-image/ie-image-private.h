@@ -42,6 +42,10 @@ typedef struct {
 	 * never frees them, so the main image does, once the picture shows
 	 * other pixels. */
 	void *own_pixels;
+	/* A JPEG or PNG decoded by our own decoder on a worker thread: the
+	 * thread and its job, until the result is put in place or dropped. */
+	Ecore_Thread *decode_thread;
+	struct Decode_Job *decode_job;
 } Mainimg_Smart_Data;
 
 /* The record of a main image object, or NULL for any other object. */
@@ -50,8 +54,9 @@ Mainimg_Smart_Data *_mainimg_data_get(const Evas_Object *obj);
 /* Takes down the processing popup, if one is up. */
 void _processing_popup_del(Mainimg_Smart_Data *sd);
 
-/* Drops the offscreen canvas of an asynchronous load and its image; any
- * completion or failure report still pending is cancelled with them. */
+/* Drops the offscreen canvas of an asynchronous load and its image, or the
+ * worker's decoding; any completion or failure report still pending is
+ * cancelled with them. */
 void _preload_release(Mainimg_Smart_Data *sd);
 
 /* Frees the main image's own pixels unless the picture still shows them
