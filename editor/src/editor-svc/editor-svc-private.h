@@ -99,6 +99,10 @@ void create_funcbar(Viewhandle *vh);
 void create_gengrid_toolbar(Viewhandle *vh);
 void _on_layout_resized(void *data, Evas *e, Evas_Object *obj, void *event_info);
 
+/* ie-processing-popup.cpp: shown and returned, text_id translated in the
+ * editor's domain; NULL when the popup cannot be made. */
+Evas_Object *ie_processing_popup_add(Evas_Object *parent, const char *text_id);
+
 /* ie-menu.cpp */
 void _on_menu_cancel(void *data, Evas_Object *obj, void *event_info);
 void _on_menu_done(void *data, Evas_Object *obj, void *event_info);

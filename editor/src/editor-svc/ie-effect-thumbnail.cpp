@@ -13,15 +13,13 @@
 #include "ie-effect-hooks.h"
 #include "ie-engine.h"
 #include "ie-image.h"
+#include "ie-malloc-ptr.h"
 
 namespace {
 
 constexpr int THUMB_SIDE = 118;
 
-struct Free_Deleter {
-	void operator()(unsigned char *p) const { free(p); }
-};
-using Pixel_Buffer = std::unique_ptr<unsigned char, Free_Deleter>;
+using Pixel_Buffer = Ie_Malloc_Ptr<unsigned char>;
 
 bool all_zero(const unsigned char *bytes, size_t count)
 {

@@ -229,11 +229,6 @@ void _on_menu_cancel(void *data, Evas_Object *, void *)
 	}
 }
 
-/* The back key waits for the registration. */
-static void _save_popup_back_cb(void *, Evas_Object *, void *)
-{
-}
-
 static void save_popup_close(Viewhandle *vh)
 {
 	if (vh->save_popup_timer) {
@@ -250,27 +245,7 @@ static Eina_Bool _save_popup_timer_cb(void *data)
 {
 	auto *vh = static_cast<Viewhandle *>(data);
 	vh->save_popup_timer = NULL;
-	Evas_Object *popup = elm_popup_add(vh->naviframe);
-	elm_object_style_set(popup, "image-editor");
-	elm_popup_align_set(popup, ELM_NOTIFY_ALIGN_FILL, 1.0);
-	evas_object_size_hint_weight_set(popup, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
-	ea_object_event_callback_add(popup, EA_CALLBACK_BACK, _save_popup_back_cb, vh);
-
-	Evas_Object *layout = elm_layout_add(popup);
-	if (!elm_layout_file_set(layout, IE_EDJ_FILE, "processing_view_layout"))
-		IE_LOG_E("Layout file set failed! %s in %s", "processing_view_layout", IE_EDJ_FILE);
-	evas_object_size_hint_weight_set(layout, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
-	elm_object_domain_translatable_part_text_set(layout, "elm.text", IE_TEXT_DOMAIN, "IDS_IV_TPOP_SAVING_ING");
-	Evas_Object *progressbar = elm_progressbar_add(layout);
-	elm_object_style_set(progressbar, "process_medium");
-	evas_object_size_hint_align_set(progressbar, EVAS_HINT_FILL, 0.5);
-	evas_object_size_hint_weight_set(progressbar, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
-	elm_progressbar_pulse_set(progressbar, EINA_TRUE);
-	elm_progressbar_pulse(progressbar, EINA_TRUE);
-	elm_object_part_content_set(layout, "processing", progressbar);
-	elm_object_part_content_set(popup, NULL, layout);
-	evas_object_show(popup);
-	vh->save_popup = popup;
+	vh->save_popup = ie_processing_popup_add(vh->naviframe, "IDS_IV_TPOP_SAVING_ING");
 	return ECORE_CALLBACK_CANCEL;
 }
 

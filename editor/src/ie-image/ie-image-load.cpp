@@ -12,8 +12,6 @@
 #include <Ecore_Evas.h>
 #include <Elementary.h>
 
-#include <libintl.h>
-
 #include <algorithm>
 #include <cstdint>
 #include <cstdlib>
@@ -26,13 +24,13 @@
 #include "ie-image-decode.h"
 #include "ie-image-private.h"
 #include "ie-image-source.h"
+#include "ie-malloc-ptr.h"
 
 namespace {
 
 constexpr const char *PRELOAD_EE_KEY = "Ecore_Evas";
 constexpr const char *PRELOAD_WIDTH_KEY = "preload_object_width";
 constexpr const char *PRELOAD_HEIGHT_KEY = "preload_object_height";
-constexpr const char *PROGRESSBAR_KEY = "progressbar";
 
 /* Formats the decoder cannot scale down; always loaded in the background. */
 constexpr const char *ASYNC_FORMAT_MARKS[] = { ".gif", ".GIF", ".wbmp", ".WBMP" };
@@ -59,10 +57,6 @@ struct Evas_Object_Deleter {
 	void operator()(Evas_Object *obj) const { evas_object_del(obj); }
 };
 using Evas_Object_Ptr = std::unique_ptr<Evas_Object, Evas_Object_Deleter>;
-
-struct Free_Deleter {
-	void operator()(void *p) const { free(p); }
-};
 
 /* Evas holds its own references to the file once the images have it. */
 struct Source_Closer {
@@ -203,7 +197,7 @@ static bool _image_pixels_put(Mainimg_Smart_Data *sd, const void *pixels, int w,
 	evas_object_image_file_set(image, NULL, NULL);
 	evas_object_image_alpha_set(image, alpha);
 	size_t bytes = 0;
-	std::unique_ptr<uint8_t, Free_Deleter> upright;
+	Ie_Malloc_Ptr<uint8_t> upright;
 	if (upright_w > 0 && upright_h > 0 &&
 	    !__builtin_mul_overflow((size_t)upright_w * (size_t)upright_h, (size_t)4, &bytes))
 		upright.reset(static_cast<uint8_t *>(malloc(bytes)));
@@ -291,7 +285,7 @@ static bool _load_resampled(Mainimg_Smart_Data *sd, const Ie_Image_Source &sourc
 	int stored_w, stored_h;
 	turned_size(plan.orientation, plan.target_w, plan.target_h, &stored_w, &stored_h);
 	size_t bytes = 0;
-	std::unique_ptr<uint8_t, Free_Deleter> buf;
+	Ie_Malloc_Ptr<uint8_t> buf;
 	if (!__builtin_mul_overflow((size_t)stored_w * (size_t)stored_h, (size_t)4, &bytes))
 		buf.reset(static_cast<uint8_t *>(calloc(1, bytes)));
 	if (!buf) {
@@ -336,21 +330,13 @@ static bool _load_decoded_now(Mainimg_Smart_Data *sd, const File_Map &map, const
 	turned_size(plan.orientation, plan.target_w, plan.target_h, &stored_w, &stored_h);
 	Ie_Decoded decoded;
 	Ie_Decode_Status status = ie_image_decode(map.data, map.size, stored_w, stored_h, NULL, NULL, &decoded);
-	std::unique_ptr<uint8_t, Free_Deleter> pixels(decoded.pixels);
+	Ie_Malloc_Ptr<uint8_t> pixels(decoded.pixels);
 	sd->orientation = plan.orientation;
 	if (!_decoded_put(sd, status, decoded))
 		return false;
 	sd->img_w = plan.target_w;
 	sd->img_h = plan.target_h;
 	return true;
-}
-
-static void _processing_popup_back_cb(void *data, Evas_Object *obj, void *event_info)
-{
-	/* The back key waits for the picture. */
-	(void)data;
-	(void)obj;
-	(void)event_info;
 }
 
 /* The popup lives on the parent: if the parent goes first, forget it. */
@@ -365,35 +351,10 @@ static void _processing_popup_deleted_cb(void *data, Evas *e, Evas_Object *popup
 
 static Evas_Object *_processing_popup_create(Mainimg_Smart_Data *sd)
 {
-	Evas_Object *popup = elm_popup_add(sd->parent);
-	if (!popup) {
-		IE_LOG_E("Cannot create processing popup");
+	Evas_Object *popup = ie_processing_popup_add(sd->parent, "IDS_360V_TPOP_LOADING_ING");
+	if (!popup)
 		return NULL;
-	}
-	elm_object_style_set(popup, "image-editor");
-	elm_popup_align_set(popup, ELM_NOTIFY_ALIGN_FILL, 1.0);
-	ea_object_event_callback_add(popup, EA_CALLBACK_BACK, _processing_popup_back_cb, NULL);
-	evas_object_size_hint_weight_set(popup, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
-
-	Evas_Object *layout = elm_layout_add(popup);
-	if (!elm_layout_file_set(layout, IE_EDJ_FILE, "processing_view_layout"))
-		IE_LOG_E("Layout file set failed! %s in %s", "processing_view_layout", IE_EDJ_FILE);
-	evas_object_size_hint_weight_set(layout, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
-	elm_object_part_text_set(layout, "elm.text", dgettext(IE_TEXT_DOMAIN, "IDS_360V_TPOP_LOADING_ING"));
-
-	Evas_Object *progressbar = elm_progressbar_add(layout);
-	elm_object_style_set(progressbar, "process_medium");
-	evas_object_size_hint_align_set(progressbar, EVAS_HINT_FILL, 0.5);
-	evas_object_size_hint_weight_set(progressbar, EVAS_HINT_EXPAND, EVAS_HINT_EXPAND);
-	/* Pulsing needs pulse mode first; without it the bar stands still. */
-	elm_progressbar_pulse_set(progressbar, EINA_TRUE);
-	elm_progressbar_pulse(progressbar, EINA_TRUE);
-	elm_object_part_content_set(layout, "processing", progressbar);
-
-	elm_object_part_content_set(popup, NULL, layout);
-	evas_object_data_set(popup, PROGRESSBAR_KEY, progressbar);
 	evas_object_event_callback_add(popup, EVAS_CALLBACK_DEL, _processing_popup_deleted_cb, sd);
-	evas_object_show(popup);
 	return popup;
 }
 

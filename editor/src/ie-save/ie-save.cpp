@@ -38,6 +38,7 @@
 #include <storage_space.h>
 
 #include "ie-debug.h"
+#include "ie-malloc-ptr.h"
 
 namespace {
 
@@ -70,10 +71,7 @@ char save_source[PATH_MAX];
  * off to reach the private directory other file systems get. */
 bool save_unnamed_files = true;
 
-struct FreeDeleter {
-	void operator()(void *ptr) const { free(ptr); }
-};
-using CString = std::unique_ptr<char, FreeDeleter>;
+using CString = Ie_Malloc_Ptr<char>;
 
 class Fd {
 public:
