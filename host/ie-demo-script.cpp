@@ -42,14 +42,20 @@ bool tap_object(Evas_Object *win, Evas_Object *obj)
 	return true;
 }
 
+Elm_Object_Item *nth_item(Evas_Object *grid, int index)
+{
+	Elm_Object_Item *item = elm_gengrid_first_item_get(grid);
+	for (int i = 0; item && i < index; i++)
+		item = elm_gengrid_item_next_get(item);
+	return item;
+}
+
 bool tap_tool(Demo_Script *s, int index)
 {
 	Evas_Object *toolbar = elm_object_part_content_get(s->editor_view, "elm.swallow.ctrlbar");
 	if (!toolbar)
 		return false;
-	Elm_Object_Item *item = elm_gengrid_first_item_get(toolbar);
-	for (int i = 0; item && i < index; i++)
-		item = elm_gengrid_item_next_get(item);
+	Elm_Object_Item *item = nth_item(toolbar, index);
 	if (!item)
 		return false;
 	Evas_Object *track = elm_object_item_track(item);
@@ -243,9 +249,7 @@ bool tap_effect(Demo_Script *s, const std::string &name)
 	}
 	wait_for_grid(grid);
 
-	Elm_Object_Item *item = elm_gengrid_first_item_get(grid);
-	for (int i = 0; item && i < index; i++)
-		item = elm_gengrid_item_next_get(item);
+	Elm_Object_Item *item = nth_item(grid, index);
 	if (!item)
 		return false;
 	bool horizontal = elm_gengrid_horizontal_get(grid);

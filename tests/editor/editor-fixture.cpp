@@ -49,6 +49,25 @@ Viewhandle *EditorTest::open_editor_on_file(const std::string &path, int rotatio
 	return vh;
 }
 
+Elm_Object_Item *EditorTest::tool(int index) const
+{
+	Elm_Object_Item *item = elm_gengrid_first_item_get(vh->toolbar);
+	for (int i = 0; item && i < index; i++)
+		item = elm_gengrid_item_next_get(item);
+	return item;
+}
+
+void EditorTest::tap_item(Elm_Object_Item *item)
+{
+	iet::settle();
+	ASSERT_NE(item, nullptr);
+	Evas_Object *track = elm_object_item_track(item);
+	int x, y;
+	iet::object_centre(track, &x, &y);
+	elm_object_item_untrack(item);
+	iet::tap(win(), x, y);
+}
+
 void EditorTest::destroy_editor()
 {
 	if (vh) {

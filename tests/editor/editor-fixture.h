@@ -26,6 +26,12 @@ protected:
 	 * its file before it does); whether it did within `timeout` seconds. */
 	bool wait_for_close(double timeout = 10.0);
 
+	/* The tool bar's item `index`, NULL past the last. */
+	Elm_Object_Item *tool(int index) const;
+	/* Taps a grid item where it is on screen, the loop settled first. */
+	void tap_item(Elm_Object_Item *item);
+	void tap_tool(int index) { tap_item(tool(index)); }
+
 	Evas_Object *inner_image() const;
 	void picture_size(int *w, int *h) const;
 	std::vector<uint32_t> picture_pixels() const;

@@ -21,13 +21,6 @@ namespace {
 
 class Bars : public EditorTest {
 protected:
-	Elm_Object_Item *tool(int index)
-	{
-		Elm_Object_Item *item = elm_gengrid_first_item_get(vh->toolbar);
-		for (int i = 0; item && i < index; i++)
-			item = elm_gengrid_item_next_get(item);
-		return item;
-	}
 	/* Whether the item's theme shows it selected: its icon sits in the
 	 * item's own Edje object. */
 	bool tool_shown_selected(int index)
@@ -37,18 +30,6 @@ protected:
 		double value;
 		const char *state = view ? edje_object_part_state_get(view, "indicator", &value) : nullptr;
 		return state && !strcmp(state, "selected");
-	}
-	/* Taps the tool bar's item `index` where it is on screen. */
-	void tap_tool(int index)
-	{
-		iet::settle();
-		Elm_Object_Item *item = tool(index);
-		ASSERT_NE(item, nullptr);
-		Evas_Object *track = elm_object_item_track(item);
-		int x, y;
-		iet::object_centre(track, &x, &y);
-		elm_object_item_untrack(item);
-		iet::tap(win(), x, y);
 	}
 };
 

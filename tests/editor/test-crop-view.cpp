@@ -20,19 +20,6 @@ struct Rect {
 
 class CropView : public EditorTest {
 protected:
-	void tap_tool(int index)
-	{
-		iet::settle();
-		Elm_Object_Item *item = elm_gengrid_first_item_get(vh->toolbar);
-		for (int i = 0; item && i < index; i++)
-			item = elm_gengrid_item_next_get(item);
-		ASSERT_NE(item, nullptr);
-		Evas_Object *track = elm_object_item_track(item);
-		int x, y;
-		iet::object_centre(track, &x, &y);
-		elm_object_item_untrack(item);
-		iet::tap(win(), x, y);
-	}
 	void tap_button(Evas_Object *button)
 	{
 		ASSERT_NE(button, nullptr);
@@ -133,6 +120,22 @@ protected:
 		return worst;
 	}
 	bool select_box_on_canvas() const { return evas_object_name_find(evas(), "SelectBox") != nullptr; }
+	/* The saved file is a w x h picture showing `expected` up to JPEG noise. */
+	void expect_saved_as(const std::string &path, const std::vector<uint32_t> &expected, int w, int h)
+	{
+		Evas_Object *check = evas_object_image_add(evas());
+		evas_object_image_file_set(check, path.c_str(), nullptr);
+		int sw = 0, sh = 0;
+		evas_object_image_size_get(check, &sw, &sh);
+		EXPECT_EQ(sw, w);
+		EXPECT_EQ(sh, h);
+		auto *pixels = static_cast<const uint32_t *>(evas_object_image_data_get(check, EINA_FALSE));
+		if (sw == w && sh == h && pixels)
+			EXPECT_LT(worst_difference(pixels, expected.data(), expected.size()), 40) << "JPEG noise only";
+		else
+			ADD_FAILURE() << "no picture to compare in " << path;
+		evas_object_del(check);
+	}
 };
 
 TEST_F(CropView, OpensInTheWindowsOrientationAndRecordsItsUse)
@@ -288,16 +291,7 @@ TEST_F(CropView, DoneCropsThePictureAndTheNextDoneSavesIt)
 	ASSERT_EQ(close_requests.size(), 1u);
 	const std::string saved = close_requests[0];
 	ASSERT_EQ(saved, picture_dir + "/photo_e001.jpg");
-	Evas_Object *check = evas_object_image_add(evas());
-	evas_object_image_file_set(check, saved.c_str(), nullptr);
-	int sw = 0, sh = 0;
-	evas_object_image_size_get(check, &sw, &sh);
-	EXPECT_EQ(sw, cw);
-	EXPECT_EQ(sh, ch);
-	auto *pixels = static_cast<const uint32_t *>(evas_object_image_data_get(check, EINA_FALSE));
-	ASSERT_NE(pixels, nullptr);
-	EXPECT_LT(worst_difference(pixels, expected.data(), expected.size()), 40) << "JPEG noise only";
-	evas_object_del(check);
+	expect_saved_as(saved, expected, cw, ch);
 	Media_Db_Row row;
 	ASSERT_EQ(media_db_lookup(saved.c_str(), &row), MEDIA_DB_ERROR_NONE);
 	EXPECT_EQ(row.width, cw);
@@ -337,16 +331,7 @@ TEST_F(CropView, ASecondCropCutsTheCroppedPictureWhereItLies)
 	tap_button(vh->done_btn);
 	ASSERT_TRUE(wait_for_close());
 	ASSERT_EQ(close_requests.size(), 1u);
-	Evas_Object *check = evas_object_image_add(evas());
-	evas_object_image_file_set(check, close_requests[0].c_str(), nullptr);
-	int sw = 0, sh = 0;
-	evas_object_image_size_get(check, &sw, &sh);
-	EXPECT_EQ(sw, cw);
-	EXPECT_EQ(sh, ch);
-	auto *pixels = static_cast<const uint32_t *>(evas_object_image_data_get(check, EINA_FALSE));
-	ASSERT_NE(pixels, nullptr);
-	EXPECT_LT(worst_difference(pixels, expected.data(), expected.size()), 40);
-	evas_object_del(check);
+	expect_saved_as(close_requests[0], expected, cw, ch);
 }
 
 TEST_F(CropView, AnAppliedCropIsNeverForgotten)
@@ -374,16 +359,7 @@ TEST_F(CropView, AnAppliedCropIsNeverForgotten)
 	tap_button(vh->done_btn);
 	ASSERT_TRUE(wait_for_close());
 	ASSERT_EQ(close_requests.size(), 1u);
-	Evas_Object *check = evas_object_image_add(evas());
-	evas_object_image_file_set(check, close_requests[0].c_str(), nullptr);
-	int sw = 0, sh = 0;
-	evas_object_image_size_get(check, &sw, &sh);
-	EXPECT_EQ(sw, cw);
-	EXPECT_EQ(sh, ch);
-	auto *pixels = static_cast<const uint32_t *>(evas_object_image_data_get(check, EINA_FALSE));
-	ASSERT_NE(pixels, nullptr);
-	EXPECT_LT(worst_difference(pixels, cropped.data(), cropped.size()), 40);
-	evas_object_del(check);
+	expect_saved_as(close_requests[0], cropped, cw, ch);
 }
 
 TEST_F(CropView, SecondFingerPausesTheBoxWhichThenKeepsToThePicture)

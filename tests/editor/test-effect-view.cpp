@@ -74,23 +74,6 @@ protected:
 		EditorTest::TearDown();
 	}
 
-	void tap_item(Elm_Object_Item *item)
-	{
-		iet::settle();
-		ASSERT_NE(item, nullptr);
-		Evas_Object *track = elm_object_item_track(item);
-		int x, y;
-		iet::object_centre(track, &x, &y);
-		elm_object_item_untrack(item);
-		iet::tap(win(), x, y);
-	}
-	void tap_tool(int index)
-	{
-		Elm_Object_Item *item = elm_gengrid_first_item_get(vh->toolbar);
-		for (int i = 0; item && i < index; i++)
-			item = elm_gengrid_item_next_get(item);
-		tap_item(item);
-	}
 	/* Opens the view with the effect tool and lets it settle. */
 	void open_effects()
 	{

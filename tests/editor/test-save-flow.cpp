@@ -49,16 +49,7 @@ protected:
 	}
 	void tap_rotate_right()
 	{
-		iet::settle();
-		Elm_Object_Item *item = elm_gengrid_first_item_get(vh->toolbar);
-		for (int i = 0; item && i < 2; i++)
-			item = elm_gengrid_item_next_get(item);
-		ASSERT_NE(item, nullptr);
-		Evas_Object *track = elm_object_item_track(item);
-		int x, y;
-		iet::object_centre(track, &x, &y);
-		elm_object_item_untrack(item);
-		iet::tap(win(), x, y);
+		tap_tool(2);
 		iet::settle();
 	}
 	/* Another process takes the media database's write lock and keeps it
