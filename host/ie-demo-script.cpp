@@ -22,6 +22,19 @@ void loop_for(double seconds)
 	edje_message_signal_process();
 }
 
+/* Runs the loop until `ready()` holds or `seconds` have passed (a busy
+ * machine runs the editor's idlers late); whether it holds. */
+template <class Ready>
+bool loop_until(Ready ready, double seconds = 10.0)
+{
+	for (double waited = 0.0; !ready(); waited += 0.05) {
+		if (waited >= seconds)
+			return false;
+		loop_for(0.05);
+	}
+	return true;
+}
+
 void tap_at(Evas_Object *win, int x, int y)
 {
 	Evas *e = evas_object_evas_get(win);
@@ -179,7 +192,7 @@ bool drag_crop_box(Demo_Script *s, const std::string &arg)
 		return false;
 	const std::string part = arg.substr(0, first);
 	int l, t, r, b;
-	if (!crop_box_rect(s, &l, &t, &r, &b))
+	if (!loop_until([&] { return crop_box_rect(s, &l, &t, &r, &b); }))
 		return false;
 	const int mx = l + (r - l) / 2, my = t + (b - t) / 2;
 	const struct {
@@ -240,11 +253,7 @@ bool tap_effect(Demo_Script *s, const std::string &name)
 	}
 	Evas_Object *grid = effect_grid(s);
 	if (!grid) {
-		if (!tap_tool(s, 3))
-			return false;
-		loop_for(0.1);
-		grid = effect_grid(s);
-		if (!grid)
+		if (!tap_tool(s, 3) || !loop_until([&] { return (grid = effect_grid(s)) != nullptr; }))
 			return false;
 	}
 	wait_for_grid(grid);
@@ -416,8 +425,7 @@ bool demo_script_run(Demo_Script *s, const std::vector<std::string> &actions)
 {
 	/* The script plays a touch screen: lists scroll under a dragging finger. */
 	elm_config_scroll_thumbscroll_enabled_set(EINA_TRUE);
-	for (int tries = 0; tries < 200 && !picture_ready(s); tries++)
-		loop_for(0.05);
+	loop_until([s] { return picture_ready(s); });
 	loop_for(0.1);
 	/* Closed before any step (a picture that could not be opened): the
 	 * host has said why; there is nothing to play. */
