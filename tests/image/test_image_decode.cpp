@@ -334,6 +334,36 @@ TEST(ProgressiveJpeg, HandsBackWhatItDoesNotTake)
 	ie_progressive_free(&p);
 }
 
+/* A file that holds nothing but one Huffman table: `per_length` codes of
+ * each length from 1 to `lengths`. */
+Bytes huffman_table_only(int lengths, int per_length)
+{
+	const int total = lengths * per_length;
+	const int length = 2 + 17 + total;
+	Bytes file = { 0xFF, 0xD8, 0xFF, 0xC4, uint8_t(length >> 8), uint8_t(length), 0x10 };
+	for (int len = 1; len <= 16; len++)
+		file.push_back(uint8_t(len <= lengths ? per_length : 0));
+	for (int i = 0; i < total; i++)
+		file.push_back(uint8_t(i));
+	file.insert(file.end(), { 0xFF, 0xD9 });
+	return file;
+}
+
+/* Hostile tables: more codes of a length than it has (255 one-bit codes
+ * would index the look-up table far past its end), or a code of all
+ * ones. Refused before anything is written. */
+TEST(ProgressiveJpeg, RefusesOverfullHuffmanTables)
+{
+	Ie_Progressive p;
+	for (const auto &[lengths, per_length] : { std::pair{ 1, 255 }, std::pair{ 1, 3 }, std::pair{ 1, 2 },
+						     std::pair{ 8, 2 }, std::pair{ 12, 21 } }) {
+		EXPECT_EQ(read_progressive(huffman_table_only(lengths, per_length), 8, 8, false, &p),
+			  Ie_Progressive_Status::NOT_OURS)
+			<< lengths << " lengths of " << per_length;
+		ie_progressive_free(&p);
+	}
+}
+
 /* ---- PNG ---- */
 
 struct Png_Options {

@@ -144,16 +144,16 @@ bool huffman_build(Huffman *t, const uint8_t counts[16], const uint8_t *values, 
 		t->first_index[len] = k;
 		t->first_code[len] = int(code);
 		for (int i = 0; i < counts[len - 1]; i++, k++, code++) {
+			/* An over-full table, or a code of all ones, which libjpeg
+			 * refuses; checked before the code indexes the table. */
+			if (code >= (1u << len) - 1)
+				return false;
 			if (len > FAST_BITS)
 				continue;
 			const int span = 1 << (FAST_BITS - len);
 			for (int j = 0; j < span; j++)
 				t->fast[(code << (FAST_BITS - len)) | uint32_t(j)] = uint16_t(len << 8 | values[k]);
 		}
-		/* An over-full table, or a code of all ones, which libjpeg
-		 * refuses. */
-		if (counts[len - 1] && code >= (1u << len))
-			return false;
 		t->limit[len] = code << (17 - len);
 		code <<= 1;
 	}
