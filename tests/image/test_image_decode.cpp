@@ -364,6 +364,19 @@ TEST(ProgressiveJpeg, RefusesOverfullHuffmanTables)
 	}
 }
 
+/* The first frame header of a JPEG made to claim w x h. */
+Bytes jpeg_claiming(Bytes file, int w, int h)
+{
+	size_t sof = 2;
+	while (file[sof + 1] != 0xC0 && file[sof + 1] != 0xC2)
+		sof += 2 + (size_t(file[sof + 2]) << 8 | file[sof + 3]);
+	file[sof + 5] = uint8_t(h >> 8);
+	file[sof + 6] = uint8_t(h);
+	file[sof + 7] = uint8_t(w >> 8);
+	file[sof + 8] = uint8_t(w);
+	return file;
+}
+
 /* ---- PNG ---- */
 
 struct Png_Options {
@@ -584,6 +597,54 @@ TEST(PngDecode, HandsBackWhatItDoesNotTake)
 	tall_damaged.insert(tall_damaged.end(), tall.end() - 12, tall.end());
 	EXPECT_TRUE(refused(tall_damaged));
 	iel_thread_count_set(0);
+}
+
+/* A header may claim any size; past the editor's limit (ie-image-decode.h)
+ * a picture is refused by every probe and decoder before anything is
+ * allocated (a PNG 16 million pixels wide had our decoder ask for 1.8 GB
+ * of row buffers, a 20000 x 18000 JPEG had libjpeg hold gigabytes of
+ * coefficients). Just within it, the probes still take it. */
+TEST(DecodeLimits, PicturesPastTheSizeLimitAreRefusedBeforeAnyDecoding)
+{
+	auto png_claiming = [](Bytes file, uint32_t w, uint32_t h) {
+		for (int i = 0; i < 4; i++) {
+			file[16 + size_t(i)] = uint8_t(w >> (24 - 8 * i));
+			file[20 + size_t(i)] = uint8_t(h >> (24 - 8 * i));
+		}
+		const uint32_t crc = crc32_gzip_refl(0, &file[12], 17);
+		for (int i = 0; i < 4; i++)
+			file[29 + size_t(i)] = uint8_t(crc >> (24 - 8 * i));
+		return file;
+	};
+	const Bytes png = write_png(test_pixels(8, 8, 3, 1, 5), 8, 8, Png_Options());
+	const Bytes jpeg = encode(test_pixels(16, 16, 3, 2, 5), 16, 16, Encoding());
+	struct Claim {
+		int w, h;
+		bool taken;
+	};
+	for (const Claim &c : { Claim{ 16777216, 1, false }, Claim{ 65001, 2, false }, Claim{ 2, 65001, false },
+				Claim{ 12000, 12000, false }, Claim{ 20036, 18757, false }, Claim{ 16384, 8192, true },
+				Claim{ 65000, 2000, true } }) {
+		SCOPED_TRACE(std::to_string(c.w) + " x " + std::to_string(c.h));
+		const Bytes claims_png = png_claiming(png, uint32_t(c.w), uint32_t(c.h));
+		int w = 0, h = 0;
+		bool alpha;
+		EXPECT_EQ(ie_png_probe(claims_png.data(), claims_png.size(), &w, &h, &alpha), c.taken);
+		EXPECT_EQ(ie_image_decode_probe(claims_png.data(), claims_png.size(), &w, &h), c.taken);
+		Ie_Decoded out;
+		EXPECT_NE(ie_image_decode(claims_png.data(), claims_png.size(), 64, 64, nullptr, nullptr, &out),
+			  Ie_Decode_Status::DONE);
+		if (c.w > 65500)
+			continue; /* a JPEG side has 16 bits */
+		const Bytes claims_jpeg = jpeg_claiming(jpeg, c.w, c.h);
+		EXPECT_EQ(ie_image_decode_probe(claims_jpeg.data(), claims_jpeg.size(), &w, &h), c.taken);
+		Ie_Progressive p;
+		EXPECT_EQ(read_progressive(claims_jpeg, 64, 64, false, &p), Ie_Progressive_Status::NOT_OURS);
+		ie_progressive_free(&p);
+		if (!c.taken)
+			EXPECT_EQ(ie_image_decode(claims_jpeg.data(), claims_jpeg.size(), 64, 64, nullptr, nullptr, &out),
+				  Ie_Decode_Status::FAILED);
+	}
 }
 
 } // namespace

@@ -670,7 +670,7 @@ Status read_frame(Decoder &d, const uint8_t *body, int length)
 	img.height = be16(body + 1);
 	img.width = be16(body + 3);
 	img.components = body[5];
-	if (img.width <= 0 || img.height <= 0 || (img.components != 1 && img.components != 3) ||
+	if (!ie_decode_size_ok(img.width, img.height) || (img.components != 1 && img.components != 3) ||
 	    length < 6 + 3 * img.components)
 		return Status::NOT_OURS;
 	img.hmax = img.vmax = 1;
