@@ -555,6 +555,9 @@ __attribute__((noinline)) bool decode_units(const Decoder &d, Scan_State &st, co
 		if (++x == units_x) {
 			x = 0;
 			y++;
+			/* Data that ran out fails the segment: stop here rather than
+			 * walk the rest of a huge picture on zeros. */
+			ok = ok && !bits.overrun();
 		}
 	}
 	bits_io = bits;
