@@ -364,6 +364,82 @@ TEST(ProgressiveJpeg, RefusesOverfullHuffmanTables)
 	}
 }
 
+/* A grey progressive JPEG of w x h whose only scan is the DC one, every
+ * block's difference +2047: the running DC sum passes INT_MAX after about
+ * a million blocks. */
+Bytes dc_climbing_jpeg(int w, int h)
+{
+	Bytes file = { 0xFF, 0xD8, 0xFF, 0xDB, 0, 67, 0 };
+	file.insert(file.end(), 64, 1);
+	file.insert(file.end(), { 0xFF, 0xC2, 0, 11, 8, uint8_t(h >> 8), uint8_t(h), uint8_t(w >> 8), uint8_t(w), 1, 1,
+				  0x11, 0 });
+	/* One DC code, "0", for a difference of 11 bits. */
+	file.insert(file.end(), { 0xFF, 0xC4, 0, 20, 0x00, 1 });
+	file.insert(file.end(), 15, 0);
+	file.push_back(11);
+	file.insert(file.end(), { 0xFF, 0xDA, 0, 8, 1, 1, 0x00, 0, 0, 0 });
+	uint32_t bits = 0;
+	int count = 0;
+	auto put = [&](uint32_t value, int n) {
+		bits = bits << n | value;
+		for (count += n; count >= 8; count -= 8) {
+			file.push_back(uint8_t(bits >> (count - 8)));
+			if (file.back() == 0xFF)
+				file.push_back(0x00);
+		}
+	};
+	const long blocks = long((w + 7) / 8) * ((h + 7) / 8);
+	for (long i = 0; i < blocks; i++)
+		put(2047, 12);
+	if (count)
+		put((1u << (8 - count)) - 1, 8 - count);
+	file.insert(file.end(), { 0xFF, 0xD9 });
+	return file;
+}
+
+/* A DC sum past int is damage, as libjpeg has it, not a wrapped value. */
+TEST(ProgressiveJpeg, RefusesADcSumPastInt)
+{
+	Ie_Progressive p;
+	const Bytes within = dc_climbing_jpeg(64, 64);
+	EXPECT_EQ(read_progressive(within, 8, 8, false, &p), Ie_Progressive_Status::DONE);
+	ie_progressive_free(&p);
+	const Bytes past = dc_climbing_jpeg(8200, 8200);
+	EXPECT_EQ(read_progressive(past, 8, 8, false, &p), Ie_Progressive_Status::NOT_OURS);
+	ie_progressive_free(&p);
+	Ie_Decoded out;
+	EXPECT_EQ(ie_image_decode(past.data(), past.size(), 64, 64, nullptr, nullptr, &out), Ie_Decode_Status::FAILED);
+	free(out.pixels);
+}
+
+/* The quarter-size inverse DCT at the extremes a file can hold (16-bit
+ * quantisers of 65535, coefficients of 32767): the sums of four products
+ * pass int, and must clamp as the value they are. */
+TEST(ProgressiveJpeg, QuarterScaleSumsDoNotWrap)
+{
+	Ie_Progressive p = {};
+	p.width = p.height = 8;
+	p.components = 1;
+	p.hmax = p.vmax = p.mcus_x = p.mcus_y = 1;
+	p.scale = 2;
+	Ie_Progressive_Plane &plane = p.planes[0];
+	plane.h = plane.v = plane.blocks_w = plane.blocks_h = plane.used_w = plane.used_h = 1;
+	plane.kept = 5;
+	int16_t coefficients[5] = { 32767, 32767, 32767, 0, 32767 };
+	plane.coefficients = coefficients;
+	std::fill(std::begin(plane.quant), std::end(plane.quant), uint16_t(65535));
+	Bytes rows;
+	auto take = [](void *data, const uint8_t *from, int count) {
+		static_cast<Bytes *>(data)->insert(static_cast<Bytes *>(data)->end(), from, from + 2 * 4 * count);
+	};
+	ASSERT_EQ(ie_progressive_render(p, take, &rows, nullptr, nullptr), Ie_Decode_Status::DONE);
+	ASSERT_EQ(rows.size(), 16u);
+	/* Top left: all four add up (white); the others cancel (mid grey). */
+	EXPECT_EQ(rows[0], 255);
+	for (int pixel = 1; pixel < 4; pixel++)
+		EXPECT_EQ(rows[size_t(pixel) * 4], 128) << pixel;
+}
+
 /* The first frame header of a JPEG made to claim w x h. */
 Bytes jpeg_claiming(Bytes file, int w, int h)
 {

@@ -321,7 +321,9 @@ IE_ALWAYS_INLINE bool decode_dc_first(Scan_State &st, Bits &b, const Scan &s, in
 		b.ensure();
 		diff = extend(b.take(size), size);
 	}
-	st.dc_pred[slot] += diff;
+	/* A running sum past int is damage, as libjpeg has it. */
+	if (__builtin_add_overflow(st.dc_pred[slot], diff, &st.dc_pred[slot]))
+		return false;
 	block.coef[0] = int16_t(uint32_t(st.dc_pred[slot]) << s.al);
 	return true;
 }
