@@ -5,6 +5,7 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <filesystem>
 #include <string>
 
 #include "ie-save-private.h"
@@ -14,9 +15,10 @@ namespace {
 
 std::string scratch_dir()
 {
-	char dir[] = "/tmp/ie-fuzz-metadata.XXXXXX";
+	static char dir[] = "/tmp/ie-fuzz-metadata.XXXXXX";
 	if (!mkdtemp(dir))
 		abort();
+	atexit([] { std::filesystem::remove_all(dir); });
 	return dir;
 }
 
