@@ -334,6 +334,125 @@ TEST(ProgressiveJpeg, HandsBackWhatItDoesNotTake)
 	ie_progressive_free(&p);
 }
 
+/* A file that holds nothing but one Huffman table: `per_length` codes of
+ * each length from 1 to `lengths`. */
+Bytes huffman_table_only(int lengths, int per_length)
+{
+	const int total = lengths * per_length;
+	const int length = 2 + 17 + total;
+	Bytes file = { 0xFF, 0xD8, 0xFF, 0xC4, uint8_t(length >> 8), uint8_t(length), 0x10 };
+	for (int len = 1; len <= 16; len++)
+		file.push_back(uint8_t(len <= lengths ? per_length : 0));
+	for (int i = 0; i < total; i++)
+		file.push_back(uint8_t(i));
+	file.insert(file.end(), { 0xFF, 0xD9 });
+	return file;
+}
+
+/* Hostile tables: more codes of a length than it has (255 one-bit codes
+ * would index the look-up table far past its end), or a code of all
+ * ones. Refused before anything is written. */
+TEST(ProgressiveJpeg, RefusesOverfullHuffmanTables)
+{
+	Ie_Progressive p;
+	for (const auto &[lengths, per_length] : { std::pair{ 1, 255 }, std::pair{ 1, 3 }, std::pair{ 1, 2 },
+						     std::pair{ 8, 2 }, std::pair{ 12, 21 } }) {
+		EXPECT_EQ(read_progressive(huffman_table_only(lengths, per_length), 8, 8, false, &p),
+			  Ie_Progressive_Status::NOT_OURS)
+			<< lengths << " lengths of " << per_length;
+		ie_progressive_free(&p);
+	}
+}
+
+/* A grey progressive JPEG of w x h whose only scan is the DC one, every
+ * block's difference +2047: the running DC sum passes INT_MAX after about
+ * a million blocks. */
+Bytes dc_climbing_jpeg(int w, int h)
+{
+	Bytes file = { 0xFF, 0xD8, 0xFF, 0xDB, 0, 67, 0 };
+	file.insert(file.end(), 64, 1);
+	file.insert(file.end(), { 0xFF, 0xC2, 0, 11, 8, uint8_t(h >> 8), uint8_t(h), uint8_t(w >> 8), uint8_t(w), 1, 1,
+				  0x11, 0 });
+	/* One DC code, "0", for a difference of 11 bits. */
+	file.insert(file.end(), { 0xFF, 0xC4, 0, 20, 0x00, 1 });
+	file.insert(file.end(), 15, 0);
+	file.push_back(11);
+	file.insert(file.end(), { 0xFF, 0xDA, 0, 8, 1, 1, 0x00, 0, 0, 0 });
+	uint32_t bits = 0;
+	int count = 0;
+	auto put = [&](uint32_t value, int n) {
+		bits = bits << n | value;
+		for (count += n; count >= 8; count -= 8) {
+			file.push_back(uint8_t(bits >> (count - 8)));
+			if (file.back() == 0xFF)
+				file.push_back(0x00);
+		}
+	};
+	const long blocks = long((w + 7) / 8) * ((h + 7) / 8);
+	for (long i = 0; i < blocks; i++)
+		put(2047, 12);
+	if (count)
+		put((1u << (8 - count)) - 1, 8 - count);
+	file.insert(file.end(), { 0xFF, 0xD9 });
+	return file;
+}
+
+/* A DC sum past int is damage, as libjpeg has it, not a wrapped value. */
+TEST(ProgressiveJpeg, RefusesADcSumPastInt)
+{
+	Ie_Progressive p;
+	const Bytes within = dc_climbing_jpeg(64, 64);
+	EXPECT_EQ(read_progressive(within, 8, 8, false, &p), Ie_Progressive_Status::DONE);
+	ie_progressive_free(&p);
+	const Bytes past = dc_climbing_jpeg(8200, 8200);
+	EXPECT_EQ(read_progressive(past, 8, 8, false, &p), Ie_Progressive_Status::NOT_OURS);
+	ie_progressive_free(&p);
+	Ie_Decoded out;
+	EXPECT_EQ(ie_image_decode(past.data(), past.size(), 64, 64, nullptr, nullptr, &out), Ie_Decode_Status::FAILED);
+	free(out.pixels);
+}
+
+/* The quarter-size inverse DCT at the extremes a file can hold (16-bit
+ * quantisers of 65535, coefficients of 32767): the sums of four products
+ * pass int, and must clamp as the value they are. */
+TEST(ProgressiveJpeg, QuarterScaleSumsDoNotWrap)
+{
+	Ie_Progressive p = {};
+	p.width = p.height = 8;
+	p.components = 1;
+	p.hmax = p.vmax = p.mcus_x = p.mcus_y = 1;
+	p.scale = 2;
+	Ie_Progressive_Plane &plane = p.planes[0];
+	plane.h = plane.v = plane.blocks_w = plane.blocks_h = plane.used_w = plane.used_h = 1;
+	plane.kept = 5;
+	int16_t coefficients[5] = { 32767, 32767, 32767, 0, 32767 };
+	plane.coefficients = coefficients;
+	std::fill(std::begin(plane.quant), std::end(plane.quant), uint16_t(65535));
+	Bytes rows;
+	auto take = [](void *data, const uint8_t *from, int count) {
+		static_cast<Bytes *>(data)->insert(static_cast<Bytes *>(data)->end(), from, from + 2 * 4 * count);
+	};
+	ASSERT_EQ(ie_progressive_render(p, take, &rows, nullptr, nullptr), Ie_Decode_Status::DONE);
+	ASSERT_EQ(rows.size(), 16u);
+	/* Top left: all four add up (white); the others cancel (mid grey). */
+	EXPECT_EQ(rows[0], 255);
+	for (int pixel = 1; pixel < 4; pixel++)
+		EXPECT_EQ(rows[size_t(pixel) * 4], 128) << pixel;
+}
+
+/* The first frame header of a JPEG made to claim w x h. */
+Bytes jpeg_claiming(Bytes file, int w, int h)
+{
+	size_t sof = 2;
+	while (file[sof + 1] != 0xC0 && file[sof + 1] != 0xC2)
+		sof += 2 + (size_t(file[sof + 2]) << 8 | file[sof + 3]);
+	file[sof + 5] = uint8_t(h >> 8);
+	file[sof + 6] = uint8_t(h);
+	file[sof + 7] = uint8_t(w >> 8);
+	file[sof + 8] = uint8_t(w);
+	return file;
+}
+
 /* ---- PNG ---- */
 
 struct Png_Options {
@@ -554,6 +673,54 @@ TEST(PngDecode, HandsBackWhatItDoesNotTake)
 	tall_damaged.insert(tall_damaged.end(), tall.end() - 12, tall.end());
 	EXPECT_TRUE(refused(tall_damaged));
 	iel_thread_count_set(0);
+}
+
+/* A header may claim any size; past the editor's limit (ie-image-decode.h)
+ * a picture is refused by every probe and decoder before anything is
+ * allocated (a PNG 16 million pixels wide had our decoder ask for 1.8 GB
+ * of row buffers, a 20000 x 18000 JPEG had libjpeg hold gigabytes of
+ * coefficients). Just within it, the probes still take it. */
+TEST(DecodeLimits, PicturesPastTheSizeLimitAreRefusedBeforeAnyDecoding)
+{
+	auto png_claiming = [](Bytes file, uint32_t w, uint32_t h) {
+		for (int i = 0; i < 4; i++) {
+			file[16 + size_t(i)] = uint8_t(w >> (24 - 8 * i));
+			file[20 + size_t(i)] = uint8_t(h >> (24 - 8 * i));
+		}
+		const uint32_t crc = crc32_gzip_refl(0, &file[12], 17);
+		for (int i = 0; i < 4; i++)
+			file[29 + size_t(i)] = uint8_t(crc >> (24 - 8 * i));
+		return file;
+	};
+	const Bytes png = write_png(test_pixels(8, 8, 3, 1, 5), 8, 8, Png_Options());
+	const Bytes jpeg = encode(test_pixels(16, 16, 3, 2, 5), 16, 16, Encoding());
+	struct Claim {
+		int w, h;
+		bool taken;
+	};
+	for (const Claim &c : { Claim{ 16777216, 1, false }, Claim{ 65001, 2, false }, Claim{ 2, 65001, false },
+				Claim{ 12000, 12000, false }, Claim{ 20036, 18757, false }, Claim{ 16384, 8192, true },
+				Claim{ 65000, 2000, true } }) {
+		SCOPED_TRACE(std::to_string(c.w) + " x " + std::to_string(c.h));
+		const Bytes claims_png = png_claiming(png, uint32_t(c.w), uint32_t(c.h));
+		int w = 0, h = 0;
+		bool alpha;
+		EXPECT_EQ(ie_png_probe(claims_png.data(), claims_png.size(), &w, &h, &alpha), c.taken);
+		EXPECT_EQ(ie_image_decode_probe(claims_png.data(), claims_png.size(), &w, &h), c.taken);
+		Ie_Decoded out;
+		EXPECT_NE(ie_image_decode(claims_png.data(), claims_png.size(), 64, 64, nullptr, nullptr, &out),
+			  Ie_Decode_Status::DONE);
+		if (c.w > 65500)
+			continue; /* a JPEG side has 16 bits */
+		const Bytes claims_jpeg = jpeg_claiming(jpeg, c.w, c.h);
+		EXPECT_EQ(ie_image_decode_probe(claims_jpeg.data(), claims_jpeg.size(), &w, &h), c.taken);
+		Ie_Progressive p;
+		EXPECT_EQ(read_progressive(claims_jpeg, 64, 64, false, &p), Ie_Progressive_Status::NOT_OURS);
+		ie_progressive_free(&p);
+		if (!c.taken)
+			EXPECT_EQ(ie_image_decode(claims_jpeg.data(), claims_jpeg.size(), 64, 64, nullptr, nullptr, &out),
+				  Ie_Decode_Status::FAILED);
+	}
 }
 
 } // namespace

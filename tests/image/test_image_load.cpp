@@ -15,6 +15,8 @@
 #include <iterator>
 #include <vector>
 
+#include <isa-l/crc.h>
+
 #include "ie-test-pictures.h"
 #include "image_test_fixture.h"
 
@@ -54,6 +56,33 @@ bool write_flat_gif(const std::string &path, int w, int h, uint32_t rgb)
 	}
 	b.insert(b.end(), { 0, 0x3b });
 	return write_bytes(path, b);
+}
+
+/* A JPEG or PNG whose header claims w x h (the PNG's CRC kept right):
+ * the data is the original's, far too little for that size. */
+Bytes claiming_size(Bytes file, int w, int h)
+{
+	auto put16 = [&](size_t at, int v) {
+		file[at] = uint8_t(v >> 8);
+		file[at + 1] = uint8_t(v);
+	};
+	if (file[0] == 0xFF) {
+		size_t sof = 2;
+		while (file[sof + 1] != 0xC0 && file[sof + 1] != 0xC2)
+			sof += 2 + (size_t(file[sof + 2]) << 8 | file[sof + 3]);
+		put16(sof + 5, h);
+		put16(sof + 7, w);
+		return file;
+	}
+	/* IHDR: the first chunk, at 8; its data at 16, its CRC at 29. */
+	put16(16, w >> 16);
+	put16(18, w);
+	put16(20, h >> 16);
+	put16(22, h);
+	const uint32_t crc = crc32_gzip_refl(0, &file[12], 17);
+	for (int i = 0; i < 4; i++)
+		file[29 + size_t(i)] = uint8_t(crc >> (24 - 8 * i));
+	return file;
 }
 
 constexpr uint32_t MARK = 0xffffff;
@@ -406,6 +435,25 @@ TEST_F(MainImageLoad, BoxAndSizeExtremesNeitherOverflowNorLoseThePicture)
 	std::string too_wide = scratch_path("too-wide.gif");
 	ASSERT_TRUE(write_flat_gif(too_wide, 40000, 24, 0x102030));
 	EXPECT_FALSE(load(too_wide));
+
+	/* Headers claiming more pixels than the editor opens (400 million, a
+	 * side longer than Evas takes): refused at once, whichever decoder
+	 * would have taken them, before anything is decoded. */
+	for (const char *name : { "huge.jpg", "huge.png", "long.jpg", "long.png" }) {
+		SCOPED_TRACE(name);
+		const bool long_side = name[0] == 'l';
+		const int w = long_side ? 65001 : 20000, h = long_side ? 2 : 20000;
+		std::string path = scratch_path(name);
+		ASSERT_TRUE(write_bytes(path, claiming_size(read_bytes(picture(name, 64, 48)), w, h)));
+		log_clear();
+		EXPECT_FALSE(load(path));
+		/* The long side Evas's own header reading refuses already. */
+		EXPECT_EQ(log_count("Cannot hold a " + std::to_string(w) + "x" + std::to_string(h) +
+				    " picture in a 720x1280 box") +
+				  load_errors(),
+			  1);
+		EXPECT_TRUE(!sd()->processing_popup && !sd()->decode_thread && !sd()->preload_image);
+	}
 
 	/* Reduced to 100 wide, the short side would round to nothing. */
 	ASSERT_TRUE(load(picture("strip.png", 2000, 8), 100, 100));

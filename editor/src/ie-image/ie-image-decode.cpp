@@ -102,7 +102,7 @@ bool jpeg_ours(const jpeg_decompress_struct &cinfo)
 {
 	const bool colours = cinfo.jpeg_color_space == JCS_GRAYSCALE || cinfo.jpeg_color_space == JCS_YCbCr ||
 			     cinfo.jpeg_color_space == JCS_RGB;
-	return colours && cinfo.data_precision == 8 && cinfo.image_width > 0 && cinfo.image_height > 0;
+	return colours && cinfo.data_precision == 8 && ie_decode_size_ok(cinfo.image_width, cinfo.image_height);
 }
 
 bool jpeg_probe(const uint8_t *data, size_t size, int *w, int *h)
@@ -113,7 +113,7 @@ bool jpeg_probe(const uint8_t *data, size_t size, int *w, int *h)
 	volatile bool ours = false;
 	if (!setjmp(d.error.jump)) {
 		jpeg_read_header(&d.cinfo, TRUE);
-		ours = jpeg_ours(d.cinfo) && d.cinfo.image_width <= INT32_MAX / 4 && d.cinfo.image_height <= INT32_MAX / 4;
+		ours = jpeg_ours(d.cinfo);
 		*w = int(d.cinfo.image_width);
 		*h = int(d.cinfo.image_height);
 	}
@@ -303,7 +303,8 @@ void png_release(Png_Decode *d)
 
 bool png_ours(png_structp png, png_infop info)
 {
-	return png_get_interlace_type(png, info) == PNG_INTERLACE_NONE;
+	return png_get_interlace_type(png, info) == PNG_INTERLACE_NONE &&
+	       ie_decode_size_ok(png_get_image_width(png, info), png_get_image_height(png, info));
 }
 
 bool png_probe(const uint8_t *data, size_t size, int *w, int *h)
@@ -314,7 +315,7 @@ bool png_probe(const uint8_t *data, size_t size, int *w, int *h)
 	if (png_prepare(&d, data, size) && !setjmp(png_jmpbuf(d.png))) {
 		png_read_info(d.png, d.info);
 		const png_uint_32 width = png_get_image_width(d.png, d.info), height = png_get_image_height(d.png, d.info);
-		ours = png_ours(d.png, d.info) && width <= INT32_MAX / 4 && height <= INT32_MAX / 4;
+		ours = png_ours(d.png, d.info);
 		*w = int(width);
 		*h = int(height);
 	}

@@ -15,6 +15,20 @@
 
 enum class Ie_Decode_Status { DONE, FAILED, CANCELLED };
 
+/* The largest picture the editor opens: no side longer than Evas's own
+ * loaders take, and no more pixels than IE_DECODE_MAX_PIXELS, past any
+ * camera's (16384 x 8192). Beyond it the decoders' working memory (libjpeg
+ * holds every coefficient of a progressive file) would run to gigabytes
+ * for a file of a few hundred bytes. Every decoder checks it before it
+ * allocates anything. */
+constexpr int IE_DECODE_MAX_SIDE = 65000;
+constexpr int64_t IE_DECODE_MAX_PIXELS = int64_t(1) << 27;
+
+inline bool ie_decode_size_ok(int64_t w, int64_t h)
+{
+	return w > 0 && h > 0 && w <= IE_DECODE_MAX_SIDE && h <= IE_DECODE_MAX_SIDE && w * h <= IE_DECODE_MAX_PIXELS;
+}
+
 struct Ie_Decoded {
 	/* target_w x target_h BGRA pixels, premultiplied, from malloc. */
 	uint8_t *pixels;
@@ -27,7 +41,7 @@ typedef bool (*Ie_Decode_Stop)(void *data);
 
 /* Whether we decode this file ourselves, and its size as stored: an 8-bit
  * JPEG in greys, YCbCr or RGB (not CMYK), or a PNG that is not interlaced
- * (the passes would need the whole picture held). */
+ * (the passes would need the whole picture held), within the size above. */
 bool ie_image_decode_probe(const uint8_t *data, size_t size, int *w, int *h);
 
 /* Decodes a file ie_image_decode_probe accepted into target_w x target_h,

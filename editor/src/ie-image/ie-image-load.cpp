@@ -108,10 +108,11 @@ static bool _named_like_gif_or_wbmp(const char *path)
 
 /* Chooses how a picture of iw x ih goes into a box of box_w x box_h. Sizes
  * are multiplied in 64 bits: the host's box and the file's header are not
- * trusted to keep products within int. */
+ * trusted to keep products within int. A picture larger than our decoders
+ * take is refused whoever would decode it: Evas would hold it whole. */
 static bool _load_plan_get(const char *path, int iw, int ih, int box_w, int box_h, Load_Plan *plan)
 {
-	if (iw <= 0 || ih <= 0 || box_w < 0 || box_h < 0)
+	if (!ie_decode_size_ok(iw, ih) || box_w < 0 || box_h < 0)
 		return false;
 
 	if ((int64_t)iw * ih <= (int64_t)box_w * box_h) {

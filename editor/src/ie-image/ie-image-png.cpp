@@ -95,8 +95,8 @@ bool read_header(const uint8_t *data, size_t size, Header *header)
 	header->bpp = header->colour == GREY ? 1 : header->colour == GREY_ALPHA ? 2 : header->colour == RGB ? 3 : 4;
 	const bool colour_ok = header->colour == GREY || header->colour == RGB || header->colour == GREY_ALPHA ||
 			       header->colour == RGBA;
-	return colour_ok && depth == 8 && compression == 0 && filter == 0 && interlace == 0 && header->w > 0 &&
-	       header->h > 0 && header->w <= INT32_MAX / 4 && header->h <= INT32_MAX / 4;
+	return colour_ok && depth == 8 && compression == 0 && filter == 0 && interlace == 0 &&
+	       ie_decode_size_ok(header->w, header->h);
 }
 
 inline int paeth(int a, int b, int c)

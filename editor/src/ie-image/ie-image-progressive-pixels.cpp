@@ -116,9 +116,9 @@ using Idct_Row = void (*)(const int16_t *, const uint16_t *, const Idct_Basis &,
  * size: every basis value is +-1/(2 sqrt 2) (or 1/(2 sqrt 2) squared, an
  * eighth, for the DC), so the samples are sums and differences over 8 in
  * integers, rounded half up. */
-inline uint8_t eighth_plus_128(int v)
+inline uint8_t eighth_plus_128(int64_t v)
 {
-	const int value = (v + 1028) >> 3;
+	const int64_t value = (v + 1028) >> 3;
 	return uint8_t(value < 0 ? 0 : value > 255 ? 255 : value);
 }
 
@@ -131,11 +131,12 @@ void idct_block_1x1(const int16_t *coef, const uint16_t *quant, const Idct_Basis
 void idct_block_2x2(const int16_t *coef, const uint16_t *quant, const Idct_Basis &, const Idct_Basis &, uint8_t *out,
 		    size_t stride)
 {
-	/* Zigzag 0, 1, 2, 4: (0, 0), across (0, 1), down (1, 0), (1, 1). */
-	const int dc = coef[0] * quant[0], across = coef[1] * quant[1];
-	const int down = coef[2] * quant[2], both = coef[4] * quant[4];
-	const int top_sum = dc + down, bottom_sum = dc - down;
-	const int top_diff = across + both, bottom_diff = across - both;
+	/* Zigzag 0, 1, 2, 4: (0, 0), across (0, 1), down (1, 0), (1, 1). Each
+	 * product fits an int, their sums only 64 bits. */
+	const int64_t dc = coef[0] * quant[0], across = coef[1] * quant[1];
+	const int64_t down = coef[2] * quant[2], both = coef[4] * quant[4];
+	const int64_t top_sum = dc + down, bottom_sum = dc - down;
+	const int64_t top_diff = across + both, bottom_diff = across - both;
 	out[0] = eighth_plus_128(top_sum + top_diff);
 	out[1] = eighth_plus_128(top_sum - top_diff);
 	out[stride] = eighth_plus_128(bottom_sum + bottom_diff);

@@ -144,16 +144,16 @@ bool huffman_build(Huffman *t, const uint8_t counts[16], const uint8_t *values, 
 		t->first_index[len] = k;
 		t->first_code[len] = int(code);
 		for (int i = 0; i < counts[len - 1]; i++, k++, code++) {
+			/* An over-full table, or a code of all ones, which libjpeg
+			 * refuses; checked before the code indexes the table. */
+			if (code >= (1u << len) - 1)
+				return false;
 			if (len > FAST_BITS)
 				continue;
 			const int span = 1 << (FAST_BITS - len);
 			for (int j = 0; j < span; j++)
 				t->fast[(code << (FAST_BITS - len)) | uint32_t(j)] = uint16_t(len << 8 | values[k]);
 		}
-		/* An over-full table, or a code of all ones, which libjpeg
-		 * refuses. */
-		if (counts[len - 1] && code >= (1u << len))
-			return false;
 		t->limit[len] = code << (17 - len);
 		code <<= 1;
 	}
@@ -321,7 +321,9 @@ IE_ALWAYS_INLINE bool decode_dc_first(Scan_State &st, Bits &b, const Scan &s, in
 		b.ensure();
 		diff = extend(b.take(size), size);
 	}
-	st.dc_pred[slot] += diff;
+	/* A running sum past int is damage, as libjpeg has it. */
+	if (__builtin_add_overflow(st.dc_pred[slot], diff, &st.dc_pred[slot]))
+		return false;
 	block.coef[0] = int16_t(uint32_t(st.dc_pred[slot]) << s.al);
 	return true;
 }
@@ -555,6 +557,9 @@ __attribute__((noinline)) bool decode_units(const Decoder &d, Scan_State &st, co
 		if (++x == units_x) {
 			x = 0;
 			y++;
+			/* Data that ran out fails the segment: stop here rather than
+			 * walk the rest of a huge picture on zeros. */
+			ok = ok && !bits.overrun();
 		}
 	}
 	bits_io = bits;
@@ -670,7 +675,7 @@ Status read_frame(Decoder &d, const uint8_t *body, int length)
 	img.height = be16(body + 1);
 	img.width = be16(body + 3);
 	img.components = body[5];
-	if (img.width <= 0 || img.height <= 0 || (img.components != 1 && img.components != 3) ||
+	if (!ie_decode_size_ok(img.width, img.height) || (img.components != 1 && img.components != 3) ||
 	    length < 6 + 3 * img.components)
 		return Status::NOT_OURS;
 	img.hmax = img.vmax = 1;
