@@ -717,9 +717,10 @@ TEST(DecodeLimits, PicturesPastTheSizeLimitAreRefusedBeforeAnyDecoding)
 		Ie_Progressive p;
 		EXPECT_EQ(read_progressive(claims_jpeg, 64, 64, false, &p), Ie_Progressive_Status::NOT_OURS);
 		ie_progressive_free(&p);
-		if (!c.taken)
+		if (!c.taken) {
 			EXPECT_EQ(ie_image_decode(claims_jpeg.data(), claims_jpeg.size(), 64, 64, nullptr, nullptr, &out),
 				  Ie_Decode_Status::FAILED);
+		}
 	}
 }
 
