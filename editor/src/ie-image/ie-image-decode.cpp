@@ -12,6 +12,7 @@
 #include <new>
 
 #include <jpeglib.h>
+#include <jerror.h>
 #include <png.h>
 
 #include "ie-engine.h"
@@ -78,8 +79,14 @@ void jpeg_error_exit(j_common_ptr cinfo)
 }
 
 /* Warnings (a stray byte before a marker, say) are passed over, as the
- * decoder itself passes over them. */
-void jpeg_emit_message(j_common_ptr, int) {}
+ * decoder itself passes over them; but data that runs out before the last
+ * row is a damaged file, which the decoder would fill with grey. */
+void jpeg_emit_message(j_common_ptr cinfo, int msg_level)
+{
+	const int code = cinfo->err->msg_code;
+	if (msg_level < 0 && (code == JWRN_HIT_MARKER || code == JWRN_JPEG_EOF))
+		jpeg_error_exit(cinfo);
+}
 void jpeg_output_message(j_common_ptr) {}
 
 struct Jpeg_Decode {
