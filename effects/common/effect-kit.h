@@ -756,29 +756,30 @@ inline void gaussian_blur(Plane &p, float sigma)
 	p.v.swap(blurred.v);
 }
 
+/* Sobel gradient magnitude of one row from the rows above and below it
+ * (the border repeated across). */
+inline void sobel_row(const float *up, const float *mid, const float *down, int w, float *mag)
+{
+	auto at = [&](int x, int l, int r) {
+		float dx = (up[r] + 2.f * mid[r] + down[r]) - (up[l] + 2.f * mid[l] + down[l]);
+		float dy = (down[l] + 2.f * down[x] + down[r]) - (up[l] + 2.f * up[x] + up[r]);
+		mag[x] = std::sqrt(dx * dx + dy * dy);
+	};
+	/* The two edge columns apart, so that the inner ones read in order. */
+	at(0, 0, std::min(1, w - 1));
+	for (int x = 1; x < w - 1; ++x)
+		at(x, x - 1, x + 1);
+	if (w > 1)
+		at(w - 1, w - 2, w - 1);
+}
+
 /* Sobel gradient magnitude of a plane into `g` (the same size, not the
  * plane itself), the border repeated. */
 inline void sobel_magnitude(const Plane &p, Plane &g)
 {
-	const int w = p.width, h = p.height;
-	for (int y = 0; y < h; ++y) {
-		const float *up = p.row(std::max(y - 1, 0));
-		const float *mid = p.row(y);
-		const float *down = p.row(std::min(y + 1, h - 1));
-		float *mag = g.row(y);
-		auto at = [&](int x, int l, int r) {
-			float dx = (up[r] + 2.f * mid[r] + down[r]) - (up[l] + 2.f * mid[l] + down[l]);
-			float dy = (down[l] + 2.f * down[x] + down[r]) - (up[l] + 2.f * up[x] + up[r]);
-			mag[x] = std::sqrt(dx * dx + dy * dy);
-		};
-		/* The two edge columns apart, so that the inner ones read in
-		 * order. */
-		at(0, 0, std::min(1, w - 1));
-		for (int x = 1; x < w - 1; ++x)
-			at(x, x - 1, x + 1);
-		if (w > 1)
-			at(w - 1, w - 2, w - 1);
-	}
+	const int h = p.height;
+	for (int y = 0; y < h; ++y)
+		sobel_row(p.row(std::max(y - 1, 0)), p.row(y), p.row(std::min(y + 1, h - 1)), p.width, g.row(y));
 }
 
 /* Runs a function and turns an allocation failure into a result code, so
