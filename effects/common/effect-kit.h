@@ -584,15 +584,28 @@ private:
 	}
 
 #if KIT_X86
-	/* Eight columns a step, their two neighbours gathered; returns where
+	/* Eight columns a step. Their neighbours lie within eight floats of
+	 * the first one's left neighbour: loaded at once and put in place,
+	 * or gathered where that reach passes the row's end. Returns where
 	 * the plain loop goes on. */
 	__attribute__((target("avx2"))) size_t across_avx2(const float *src, float *dst) const
 	{
 		const size_t width = fx_.size();
 		size_t x = 0;
 		for (; x + 8 <= width; x += 8) {
-			const __m256 a = _mm256_i32gather_ps(src, _mm256_loadu_si256(reinterpret_cast<const __m256i *>(&x0_[x])), 4);
-			const __m256 b = _mm256_i32gather_ps(src, _mm256_loadu_si256(reinterpret_cast<const __m256i *>(&x1_[x])), 4);
+			const __m256i left = _mm256_loadu_si256(reinterpret_cast<const __m256i *>(&x0_[x]));
+			const __m256i right = _mm256_loadu_si256(reinterpret_cast<const __m256i *>(&x1_[x]));
+			const int first = x0_[x];
+			__m256 a, b;
+			if (x1_[x + 7] - first < 8 && first + 8 <= small_.width) {
+				const __m256 window = _mm256_loadu_ps(src + first);
+				const __m256i start = _mm256_set1_epi32(first);
+				a = _mm256_permutevar8x32_ps(window, _mm256_sub_epi32(left, start));
+				b = _mm256_permutevar8x32_ps(window, _mm256_sub_epi32(right, start));
+			} else {
+				a = _mm256_i32gather_ps(src, left, 4);
+				b = _mm256_i32gather_ps(src, right, 4);
+			}
 			_mm256_storeu_ps(dst + x, _mm256_add_ps(a, _mm256_mul_ps(_mm256_sub_ps(b, a), _mm256_loadu_ps(&fx_[x]))));
 		}
 		return x;
