@@ -11,14 +11,33 @@ namespace {
 inline int magic_pen_body(const uint8_t *in, uint8_t *out, int width, int height)
 {
 	return kit::guarded([&] {
+		const kit::Path path = kit::best_path();
 		const float extent = float(std::max(width, height));
-		kit::Plane luma = luma_rgb888(in, width, height);
-		kit::Plane smoothed(width, height);
-		kit::gaussian_blur(luma, smoothed, std::max(0.7f, extent / 900.f));
-		kit::Plane &lines = luma;
-		kit::sobel_magnitude(smoothed, lines);
-		for (float &v : lines.v)
-			v = kit::smoothstep(12.f, 90.f, v);
+
+		/* The lines, kept whole: the halo blurs them all before the first
+		 * row is drawn. The luma is smoothed as its rows come, and each
+		 * line row is found from three smoothed rows. */
+		kit::Plane lines(width, height);
+		{
+			kit::Floats luma_row(static_cast<size_t>(width));
+			kit::BlurredRows smoothed(width, height, std::max(0.7f, extent / 900.f), [&](int y) {
+				const uint8_t *px = in + size_t(y) * size_t(width) * 3;
+				for (int x = 0; x < width; ++x, px += 3)
+					luma_row[size_t(x)] = 0.299f * px[0] + 0.587f * px[1] + 0.114f * px[2];
+				return luma_row.data();
+			});
+			kit::Floats ring(size_t(width) * 3);
+			auto smoothed_at = [&](int y) { return &ring[size_t(y % 3) * size_t(width)]; };
+			for (int y = 0, made = -1; y < height; ++y) {
+				const int below = std::min(y + 1, height - 1);
+				while (made < below)
+					++made, smoothed.row(made, smoothed_at(made));
+				float *line = lines.row(y);
+				kit::sobel_row(smoothed_at(std::max(y - 1, 0)), smoothed_at(y), smoothed_at(below), width, line);
+				for (int x = 0; x < width; ++x)
+					line[x] = kit::smoothstep(12.f, 90.f, line[x]);
+			}
+		}
 		kit::BlurredRows halo(width, height, extent / 160.f, [&](int y) { return lines.row(y); });
 
 		/* The stroke colour: the picture's colour smoothed, so that a line
@@ -29,14 +48,15 @@ inline int magic_pen_body(const uint8_t *in, uint8_t *out, int width, int height
 			{width, height, extent / 300.f, kit::ChannelRows(in, width, 3, 2)}};
 		kit::Floats rows(size_t(width) * 4);
 		float *halo_row = rows.data(), *red = halo_row + width, *green = red + width, *blue = green + width;
+		constexpr float BRIGHTEST = 0.85f * 255.f;
 		for (int y = 0; y < height; ++y) {
 			halo.row(y, halo_row);
 			colour[0].row(y, red);
 			colour[1].row(y, green);
 			colour[2].row(y, blue);
 			const float *line = lines.row(y);
-			uint8_t *o = out + size_t(y) * size_t(width) * 3;
-			for (int x = 0; x < width; ++x, o += 3) {
+			/* Each pixel's colour is replaced by its stroke, then written. */
+			for (int x = 0; x < width; ++x) {
 				float r = red[x], g = green[x], b = blue[x];
 				float l = 0.299f * r + 0.587f * g + 0.114f * b;
 				/* Richer, at full brightness, nudged towards white so
@@ -44,14 +64,15 @@ inline int magic_pen_body(const uint8_t *in, uint8_t *out, int width, int height
 				r = std::max(0.f, l + (r - l) * 2.2f);
 				g = std::max(0.f, l + (g - l) * 2.2f);
 				b = std::max(0.f, l + (b - l) * 2.2f);
-				float scale = 0.85f * 255.f / std::max(std::max(std::max(r, g), b), 1.f);
+				float scale = BRIGHTEST / std::max(std::max(std::max(r, g), b), 1.f);
 				float light = line[x] + halo_row[x] * 1.6f;
 				/* A faint trace of the picture stays as the dark ground. */
 				float ground = l * 0.08f;
-				o[0] = kit::clamp_byte(ground + (r * scale + 38.f) * light);
-				o[1] = kit::clamp_byte(ground + (g * scale + 38.f) * light);
-				o[2] = kit::clamp_byte(ground + (b * scale + 38.f) * light);
+				red[x] = ground + (r * scale + 38.f) * light;
+				green[x] = ground + (g * scale + 38.f) * light;
+				blue[x] = ground + (b * scale + 38.f) * light;
 			}
+			kit::write_row(red, green, blue, out + size_t(y) * size_t(width) * 3, width, 3, path);
 		}
 		return int(kit::RESULT_OK);
 	});

@@ -86,6 +86,80 @@ inline uint8_t clamp_byte(float v)
 	return uint8_t(v <= 0.f ? 0 : (v >= 255.f ? 255 : int(v + 0.5f)));
 }
 
+#if KIT_X86
+/* clamp_byte of eight values, each in a 32-bit lane. */
+__attribute__((target("avx2"))) inline __m256i clamp_bytes_avx2(__m256 v)
+{
+	const __m256i rounded = _mm256_cvttps_epi32(_mm256_add_ps(v, _mm256_set1_ps(0.5f)));
+	const __m256i low = _mm256_castps_si256(_mm256_cmp_ps(v, _mm256_setzero_ps(), _CMP_LE_OQ));
+	const __m256i high = _mm256_castps_si256(_mm256_cmp_ps(v, _mm256_set1_ps(255.f), _CMP_GE_OQ));
+	return _mm256_blendv_epi8(_mm256_andnot_si256(low, rounded), _mm256_set1_epi32(255), high);
+}
+
+/* Eight pixels of three 0..255 lanes as 24 bytes, the first lane first. */
+__attribute__((target("avx2"))) inline void store_three_avx2(__m256i first, __m256i second, __m256i third, uint8_t *dst)
+{
+	const __m256i pixels = _mm256_or_si256(first, _mm256_or_si256(_mm256_slli_epi32(second, 8), _mm256_slli_epi32(third, 16)));
+	const __m256i order = _mm256_setr_epi8(0, 1, 2, 4, 5, 6, 8, 9, 10, 12, 13, 14, -1, -1, -1, -1, 0, 1, 2, 4, 5, 6, 8,
+					       9, 10, 12, 13, 14, -1, -1, -1, -1);
+	const __m256i packed =
+		_mm256_permutevar8x32_epi32(_mm256_shuffle_epi8(pixels, order), _mm256_setr_epi32(0, 1, 2, 4, 5, 6, 3, 7));
+	_mm_storeu_si128(reinterpret_cast<__m128i *>(dst), _mm256_castsi256_si128(packed));
+	_mm_storel_epi64(reinterpret_cast<__m128i *>(dst + 16), _mm256_extracti128_si256(packed, 1));
+}
+#endif
+
+/* A row of three float channels written as packed bytes, clamped and
+ * rounded, the first channel first; `step` is the bytes per pixel (3, or 4
+ * with the fourth byte set opaque). */
+inline void write_row_reference(const float *first, const float *second, const float *third, uint8_t *dst, int width,
+				int step)
+{
+	for (int x = 0; x < width; ++x, dst += step) {
+		dst[0] = clamp_byte(first[x]);
+		dst[1] = clamp_byte(second[x]);
+		dst[2] = clamp_byte(third[x]);
+		if (step == 4)
+			dst[3] = 255;
+	}
+}
+
+#if KIT_X86
+__attribute__((target("avx2"))) inline void write_row_avx2(const float *first, const float *second, const float *third,
+							    uint8_t *dst, int width, int step)
+{
+	int x = 0;
+	if (step == 3) {
+		for (; x + 8 <= width; x += 8)
+			store_three_avx2(clamp_bytes_avx2(_mm256_loadu_ps(first + x)), clamp_bytes_avx2(_mm256_loadu_ps(second + x)),
+					 clamp_bytes_avx2(_mm256_loadu_ps(third + x)), dst + size_t(x) * 3);
+	} else {
+		const __m256i opaque = _mm256_set1_epi32(int(0xff000000u));
+		for (; x + 8 <= width; x += 8) {
+			const __m256i pixels = _mm256_or_si256(
+				_mm256_or_si256(clamp_bytes_avx2(_mm256_loadu_ps(first + x)),
+						_mm256_slli_epi32(clamp_bytes_avx2(_mm256_loadu_ps(second + x)), 8)),
+				_mm256_or_si256(_mm256_slli_epi32(clamp_bytes_avx2(_mm256_loadu_ps(third + x)), 16), opaque));
+			_mm256_storeu_si256(reinterpret_cast<__m256i *>(dst + size_t(x) * 4), pixels);
+		}
+	}
+	write_row_reference(first + x, second + x, third + x, dst + size_t(x) * size_t(step), width - x, step);
+}
+#endif
+
+inline void write_row(const float *first, const float *second, const float *third, uint8_t *dst, int width, int step,
+		      Path path)
+{
+#if KIT_X86
+	if (path == Path::AVX2) {
+		write_row_avx2(first, second, third, dst, width, step);
+		return;
+	}
+#endif
+	(void)path;
+	write_row_reference(first, second, third, dst, width, step);
+}
+
 /* BT.601 luma in 8 bits; the weights add up to 256. */
 inline int luma(int r, int g, int b)
 {
@@ -310,6 +384,68 @@ inline void box_blur_columns(const Plane &src, Plane &dst, int radius)
 	}
 }
 
+/* dst[x] = 0 + rows[0][x] * taps[0] + rows[1][x] * taps[1] + ..., added in
+ * that order: a separable convolution's pass, the rows being shifted views
+ * of one row (across) or neighbouring rows (down). */
+inline void weighted_sum_reference(const float *const *rows, const float *taps, int n, int width, float *dst)
+{
+	std::fill(dst, dst + width, 0.f);
+	for (int k = 0; k < n; ++k) {
+		const float *src = rows[k];
+		const float weight = taps[k];
+		for (int x = 0; x < width; ++x)
+			dst[x] += src[x] * weight;
+	}
+}
+
+#if KIT_X86
+/* The same sums kept in registers over all the taps, 32 outputs a step. */
+__attribute__((target("avx2"))) inline void weighted_sum_avx2(const float *const *rows, const float *taps, int n,
+							       int width, float *dst)
+{
+	int x = 0;
+	for (; x + 32 <= width; x += 32) {
+		__m256 a = _mm256_setzero_ps(), b = a, c = a, d = a;
+		for (int k = 0; k < n; ++k) {
+			const float *src = rows[k] + x;
+			const __m256 weight = _mm256_broadcast_ss(taps + k);
+			a = _mm256_add_ps(a, _mm256_mul_ps(_mm256_loadu_ps(src), weight));
+			b = _mm256_add_ps(b, _mm256_mul_ps(_mm256_loadu_ps(src + 8), weight));
+			c = _mm256_add_ps(c, _mm256_mul_ps(_mm256_loadu_ps(src + 16), weight));
+			d = _mm256_add_ps(d, _mm256_mul_ps(_mm256_loadu_ps(src + 24), weight));
+		}
+		_mm256_storeu_ps(dst + x, a);
+		_mm256_storeu_ps(dst + x + 8, b);
+		_mm256_storeu_ps(dst + x + 16, c);
+		_mm256_storeu_ps(dst + x + 24, d);
+	}
+	for (; x + 8 <= width; x += 8) {
+		__m256 a = _mm256_setzero_ps();
+		for (int k = 0; k < n; ++k)
+			a = _mm256_add_ps(a, _mm256_mul_ps(_mm256_loadu_ps(rows[k] + x), _mm256_broadcast_ss(taps + k)));
+		_mm256_storeu_ps(dst + x, a);
+	}
+	for (; x < width; ++x) {
+		float sum = 0.f;
+		for (int k = 0; k < n; ++k)
+			sum += rows[k][x] * taps[k];
+		dst[x] = sum;
+	}
+}
+#endif
+
+inline void weighted_sum(const float *const *rows, const float *taps, int n, int width, float *dst, Path path)
+{
+#if KIT_X86
+	if (path == Path::AVX2) {
+		weighted_sum_avx2(rows, taps, n, width, dst);
+		return;
+	}
+#endif
+	(void)path;
+	weighted_sum_reference(rows, taps, n, width, dst);
+}
+
 /* The sampled Gaussian of a direct convolution: exact for the small widths
  * where box passes, whose radius is a whole number, cannot tell sigma 0.8
  * from sigma 1.2. */
@@ -325,11 +461,32 @@ inline std::vector<float> gaussian_taps(float sigma)
 	return kernel;
 }
 
+#if KIT_X86
+/* Whole blocks of a row, eight a step, each summed from zero in the order
+ * of its pixels and added to its running sum; returns the first block left
+ * for the plain loop. */
+__attribute__((target("avx2"))) inline int shrink_blocks_avx2(const float *src, int width, int factor, float *row_sum)
+{
+	const __m256i starts = _mm256_mullo_epi32(_mm256_setr_epi32(0, 1, 2, 3, 4, 5, 6, 7), _mm256_set1_epi32(factor));
+	int sx = 0;
+	for (; (sx + 8) * factor <= width; sx += 8) {
+		const float *block = src + size_t(sx) * size_t(factor);
+		__m256 sum = _mm256_setzero_ps();
+		for (int i = 0; i < factor; ++i)
+			sum = _mm256_add_ps(sum, _mm256_i32gather_ps(block + i, starts, 4));
+		_mm256_storeu_ps(row_sum + sx, _mm256_add_ps(_mm256_loadu_ps(row_sum + sx), sum));
+	}
+	return sx;
+}
+#endif
+
 /* Mean of each factor x factor block (the last ones partial) of a picture
  * whose rows `rows(y)` hands out in order. */
 template <class Rows>
 Plane shrink_rows(int width, int height, int factor, Rows &&rows)
 {
+	const Path path = best_path();
+	(void)path;
 	Plane small((width + factor - 1) / factor, (height + factor - 1) / factor);
 	std::vector<float> row_sum(size_t(small.width));
 	for (int sy = 0; sy < small.height; ++sy) {
@@ -346,7 +503,12 @@ Plane shrink_rows(int width, int height, int factor, Rows &&rows)
 					row_sum[size_t(pairs)] += src[width - 1];
 				continue;
 			}
-			for (int sx = 0; sx < small.width; ++sx) {
+			int sx = 0;
+#if KIT_X86
+			if (path == Path::AVX2)
+				sx = shrink_blocks_avx2(src, width, factor, row_sum.data());
+#endif
+			for (; sx < small.width; ++sx) {
 				const int x0 = sx * factor, x1 = std::min(x0 + factor, width);
 				float sum = 0.f;
 				for (int x = x0; x < x1; ++x)
@@ -409,16 +571,50 @@ private:
 		held_[slot] = wanted;
 		const float *src = small_.row(wanted);
 		float *dst = across_[slot].data();
-		const size_t width = fx_.size();
-		for (size_t x = 0; x < width; ++x) {
+		size_t x = 0;
+#if KIT_X86
+		if (path_ == Path::AVX2)
+			x = across_avx2(src, dst);
+#endif
+		for (; x < fx_.size(); ++x) {
 			const float a = src[x0_[x]], b = src[x1_[x]];
 			dst[x] = a + (b - a) * fx_[x];
 		}
 		return dst;
 	}
 
+#if KIT_X86
+	/* Eight columns a step. Their neighbours lie within eight floats of
+	 * the first one's left neighbour: loaded at once and put in place,
+	 * or gathered where that reach passes the row's end. Returns where
+	 * the plain loop goes on. */
+	__attribute__((target("avx2"))) size_t across_avx2(const float *src, float *dst) const
+	{
+		const size_t width = fx_.size();
+		size_t x = 0;
+		for (; x + 8 <= width; x += 8) {
+			const __m256i left = _mm256_loadu_si256(reinterpret_cast<const __m256i *>(&x0_[x]));
+			const __m256i right = _mm256_loadu_si256(reinterpret_cast<const __m256i *>(&x1_[x]));
+			const int first = x0_[x];
+			__m256 a, b;
+			if (x1_[x + 7] - first < 8 && first + 8 <= small_.width) {
+				const __m256 window = _mm256_loadu_ps(src + first);
+				const __m256i start = _mm256_set1_epi32(first);
+				a = _mm256_permutevar8x32_ps(window, _mm256_sub_epi32(left, start));
+				b = _mm256_permutevar8x32_ps(window, _mm256_sub_epi32(right, start));
+			} else {
+				a = _mm256_i32gather_ps(src, left, 4);
+				b = _mm256_i32gather_ps(src, right, 4);
+			}
+			_mm256_storeu_ps(dst + x, _mm256_add_ps(a, _mm256_mul_ps(_mm256_sub_ps(b, a), _mm256_loadu_ps(&fx_[x]))));
+		}
+		return x;
+	}
+#endif
+
 	const Plane &small_;
 	int height_;
+	Path path_ = best_path();
 	float inverse_;
 	std::vector<int> x0_, x1_;
 	std::vector<float> fx_;
@@ -460,6 +656,7 @@ public:
 		if (sigma > 0.f && sigma < 2.5f) {
 			taps_ = gaussian_taps(sigma);
 			radius_ = int(taps_.size() / 2);
+			sources_.resize(taps_.size());
 			ring_ = Floats(size_t(2 * radius_ + 1) * size_t(width));
 			line_ = Floats(size_t(width + 2 * radius_));
 			source_ = [rows](int y) mutable { return rows(y); };
@@ -498,14 +695,10 @@ private:
 		std::fill(line_.begin(), line_.begin() + r, src[0]);
 		std::copy(src, src + width_, line_.begin() + r);
 		std::fill(line_.begin() + r + width_, line_.end(), src[width_ - 1]);
-		float *dst = &ring_[size_t(j % (2 * r + 1)) * size_t(width_)];
-		std::fill(dst, dst + width_, 0.f);
-		for (int k = 0; k <= 2 * r; ++k) {
-			const float *shifted = &line_[size_t(k)];
-			const float weight = taps_[size_t(k)];
-			for (int x = 0; x < width_; ++x)
-				dst[x] += shifted[x] * weight;
-		}
+		for (int k = 0; k <= 2 * r; ++k)
+			sources_[size_t(k)] = &line_[size_t(k)];
+		weighted_sum(sources_.data(), taps_.data(), 2 * r + 1, width_, &ring_[size_t(j % (2 * r + 1)) * size_t(width_)],
+			     path_);
 	}
 
 	void convolve(int y, float *dst)
@@ -513,20 +706,19 @@ private:
 		const int r = radius_;
 		while (blurred_to_ < std::min(y + r, height_ - 1))
 			across(++blurred_to_);
-		std::fill(dst, dst + width_, 0.f);
 		for (int k = -r; k <= r; ++k) {
 			const int j = std::clamp(y + k, 0, height_ - 1);
-			const float *src = &ring_[size_t(j % (2 * r + 1)) * size_t(width_)];
-			const float weight = taps_[size_t(k + r)];
-			for (int x = 0; x < width_; ++x)
-				dst[x] += src[x] * weight;
+			sources_[size_t(k + r)] = &ring_[size_t(j % (2 * r + 1)) * size_t(width_)];
 		}
+		weighted_sum(sources_.data(), taps_.data(), 2 * r + 1, width_, dst, path_);
 	}
 
 	int width_, height_;
+	Path path_ = best_path();
 	Plane small_, whole_;
 	std::unique_ptr<Expander> expander_;
 	std::vector<float> taps_;
+	std::vector<const float *> sources_;
 	int radius_ = 0;
 	int blurred_to_ = -1;
 	Floats ring_, line_;
@@ -577,29 +769,30 @@ inline void gaussian_blur(Plane &p, float sigma)
 	p.v.swap(blurred.v);
 }
 
+/* Sobel gradient magnitude of one row from the rows above and below it
+ * (the border repeated across). */
+inline void sobel_row(const float *up, const float *mid, const float *down, int w, float *mag)
+{
+	auto at = [&](int x, int l, int r) {
+		float dx = (up[r] + 2.f * mid[r] + down[r]) - (up[l] + 2.f * mid[l] + down[l]);
+		float dy = (down[l] + 2.f * down[x] + down[r]) - (up[l] + 2.f * up[x] + up[r]);
+		mag[x] = std::sqrt(dx * dx + dy * dy);
+	};
+	/* The two edge columns apart, so that the inner ones read in order. */
+	at(0, 0, std::min(1, w - 1));
+	for (int x = 1; x < w - 1; ++x)
+		at(x, x - 1, x + 1);
+	if (w > 1)
+		at(w - 1, w - 2, w - 1);
+}
+
 /* Sobel gradient magnitude of a plane into `g` (the same size, not the
  * plane itself), the border repeated. */
 inline void sobel_magnitude(const Plane &p, Plane &g)
 {
-	const int w = p.width, h = p.height;
-	for (int y = 0; y < h; ++y) {
-		const float *up = p.row(std::max(y - 1, 0));
-		const float *mid = p.row(y);
-		const float *down = p.row(std::min(y + 1, h - 1));
-		float *mag = g.row(y);
-		auto at = [&](int x, int l, int r) {
-			float dx = (up[r] + 2.f * mid[r] + down[r]) - (up[l] + 2.f * mid[l] + down[l]);
-			float dy = (down[l] + 2.f * down[x] + down[r]) - (up[l] + 2.f * up[x] + up[r]);
-			mag[x] = std::sqrt(dx * dx + dy * dy);
-		};
-		/* The two edge columns apart, so that the inner ones read in
-		 * order. */
-		at(0, 0, std::min(1, w - 1));
-		for (int x = 1; x < w - 1; ++x)
-			at(x, x - 1, x + 1);
-		if (w > 1)
-			at(w - 1, w - 2, w - 1);
-	}
+	const int h = p.height;
+	for (int y = 0; y < h; ++y)
+		sobel_row(p.row(std::max(y - 1, 0)), p.row(y), p.row(std::min(y + 1, h - 1)), p.width, g.row(y));
 }
 
 /* Runs a function and turns an allocation failure into a result code, so

@@ -63,29 +63,35 @@ inline int soft_glow_body(const unsigned char *in, unsigned char *out, int width
 		const float bloom_gain = 1.1f * strength;
 		const float bloom_cap = 255.f * strength;
 		constexpr float INVERSE_255 = 1.f / 255.f;
-		kit::Floats rows(size_t(width) * 2);
-		float *soft = rows.data(), *glow = soft + width;
-		/* Red, green and blue are bytes 2, 1 and 0. */
+		/* The three channels side by side, so that each output row is
+		 * written whole; red, green and blue are bytes 2, 1 and 0. */
+		std::unique_ptr<kit::Expander> glow_rows[3];
+		std::unique_ptr<kit::BlurredRows> soft_rows[3];
 		for (int c = 0; c < 3; ++c) {
-			const int byte = 2 - c;
 			kit::gaussian_blur_full(*small_planes[c], glow_sigma / float(factor));
-			kit::Expander glow_rows(*small_planes[c], factor, width, height);
-			kit::BlurredRows soft_rows(width, height, std::max(1.f, extent / 400.f), kit::ChannelRows(in, width, 4, byte));
-			for (int y = 0; y < height; ++y) {
-				soft_rows.row(y, soft);
-				glow_rows.row(y, glow);
-				const unsigned char *src = in + size_t(y) * size_t(width) * 4 + byte;
-				unsigned char *dst = out + size_t(y) * size_t(width) * 4 + byte;
+			glow_rows[c] = std::make_unique<kit::Expander>(*small_planes[c], factor, width, height);
+			soft_rows[c] = std::make_unique<kit::BlurredRows>(width, height, std::max(1.f, extent / 400.f),
+									  kit::ChannelRows(in, width, 4, 2 - c));
+		}
+		const kit::Path path = kit::best_path();
+		kit::Floats rows(size_t(width) * 5);
+		float *soft = rows.data(), *glow = soft + width, *lit[3] = {glow + width, glow + 2 * width, glow + 3 * width};
+		for (int y = 0; y < height; ++y) {
+			const unsigned char *px = in + size_t(y) * size_t(width) * 4;
+			for (int c = 0; c < 3; ++c) {
+				soft_rows[c]->row(y, soft);
+				glow_rows[c]->row(y, glow);
+				const unsigned char *src = px + (2 - c);
+				float *dst = lit[c];
 				for (int x = 0; x < width; ++x) {
 					float o = src[size_t(x) * 4];
 					float base = o + (soft[x] - o) * soften;
 					float bloom = std::min(bloom_cap, glow[x] * bloom_gain);
-					dst[size_t(x) * 4] = kit::clamp_byte(255.f - (255.f - base) * (255.f - bloom) * INVERSE_255);
+					dst[x] = 255.f - (255.f - base) * (255.f - bloom) * INVERSE_255;
 				}
 			}
+			kit::write_row(lit[2], lit[1], lit[0], out + size_t(y) * size_t(width) * 4, width, 4, path);
 		}
-		for (size_t i = 0; i < size_t(width) * size_t(height); ++i)
-			out[i * 4 + 3] = 255;
 		return int(kit::RESULT_OK);
 	});
 }

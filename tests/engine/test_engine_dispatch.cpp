@@ -4,6 +4,8 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <mutex>
+#include <thread>
 
 #include "PhotoEditorEngine.h"
 #include "engine-test-util.h"
@@ -24,6 +26,7 @@ struct ClosedCall {
 
 std::vector<Call> calls;
 std::vector<ClosedCall> closed_calls;
+std::mutex closed_calls_mutex;
 int closed_result;
 
 /* Each stand-in writes out = in ^ 0x5a, so its result is recognisable. */
@@ -59,7 +62,10 @@ int IEL_Apply_Effect(const IEL_Image *input, IEL_Image *output, const IEL_Effect
 		call.texture = *param->pstTexture;
 		call.texture_pixels.assign(call.texture.pbBuf, call.texture.pbBuf + pixels * 4);
 	}
-	closed_calls.push_back(call);
+	{
+		std::lock_guard<std::mutex> lock(closed_calls_mutex);
+		closed_calls.push_back(call);
+	}
 	for (size_t i = 0; i < pixels * 3 && !closed_result; i++)
 		output->pbBuf[i] = static_cast<uint8_t>(input->pbBuf[i] + 1);
 	return closed_result;
@@ -215,6 +221,28 @@ TEST_F(Dispatch, WrapperFailures)
 	EXPECT_TRUE(closed_calls.empty());
 }
 
+/* The texture file's 384 x 512 RGB pixels as opaque BGRA, scaled to the
+ * picture's size. */
+std::vector<uint8_t> scaled_texture(const std::vector<uint8_t> &content, uint32_t width, uint32_t height)
+{
+	std::vector<uint8_t> expanded(384 * 512 * 4), scaled(size_t(width) * height * 4);
+	for (size_t i = 0; i < 384 * 512; i++) {
+		std::memcpy(&expanded[i * 4], &content[i * 3], 3);
+		expanded[i * 4 + 3] = 255;
+	}
+	IEL_Image whole = {384, 512, IEL_FORMAT_BGRA8888, expanded.data()}, target = {width, height, IEL_FORMAT_BGRA8888, scaled.data()};
+	EXPECT_EQ(IEL_Resize_Image(&whole, &target), IEL_OK);
+	return scaled;
+}
+
+void write_file(const std::string &path, const std::vector<uint8_t> &content, size_t bytes)
+{
+	FILE *file = fopen(path.c_str(), "wb");
+	ASSERT_TRUE(file);
+	fwrite(content.data(), 1, bytes, file);
+	fclose(file);
+}
+
 /* The texture is a file of 384 x 512 RGB pixels, read no further; a missing
  * or short file fails the wrapper, and the dispatcher then leaves zeros. */
 TEST_F(Dispatch, SketchTexture)
@@ -227,9 +255,7 @@ TEST_F(Dispatch, SketchTexture)
 	EXPECT_TRUE(closed_calls.empty() && out.pixels() == std::vector<uint8_t>(out.size, 0));
 	std::vector<uint8_t> content = random_picture(589824 + 10, 1, 11, IEL_FORMAT_RGB888, 1).pixels();
 	for (size_t bytes : {size_t(589823), content.size()}) {
-		FILE *file = fopen(path.c_str(), "wb");
-		fwrite(content.data(), 1, bytes, file);
-		fclose(file);
+		write_file(path, content, bytes);
 		EXPECT_EQ(IEL_Sketch(&src.record, &out.record), bytes == 589823 ? IEL_ERR_FILE : IEL_OK);
 		EXPECT_EQ(closed_calls.size(), bytes == 589823 ? 0u : 1u);
 	}
@@ -238,13 +264,95 @@ TEST_F(Dispatch, SketchTexture)
 	const ClosedCall &call = closed_calls[0];
 	EXPECT_TRUE(call.param.u16EffectId == IEL_EFFECT_ID_SKETCH && call.option == 2);
 	EXPECT_TRUE(call.texture.u32Width == 9 && call.texture.u32Height == 7 && call.texture.eFormat == IEL_FORMAT_BGRA8888);
-	std::vector<uint8_t> expanded(384 * 512 * 4), scaled(9 * 7 * 4);
-	for (size_t i = 0; i < 384 * 512; i++) {
-		std::memcpy(&expanded[i * 4], &content[i * 3], 3);
-		expanded[i * 4 + 3] = 255;
-	}
-	IEL_Image whole = {384, 512, IEL_FORMAT_BGRA8888, expanded.data()}, target = {9, 7, IEL_FORMAT_BGRA8888, scaled.data()};
-	ASSERT_EQ(IEL_Resize_Image(&whole, &target), IEL_OK);
-	EXPECT_EQ(call.texture_pixels, scaled);
+	EXPECT_EQ(call.texture_pixels, scaled_texture(content, 9, 7));
 	EXPECT_EQ(out.pixels(), closed_result_of(src.pixels()));
+}
+
+/* The scaled texture is kept between calls: whatever sizes come in turn and
+ * however the file changes (same length, other bytes; gone; cut short),
+ * each call gets the texture a first call would. */
+TEST_F(Dispatch, SketchTextureKeptOnlyWhileFileAndSizeMatch)
+{
+	const std::string path = "/tmp/sketch-texture-kept-" + std::to_string(getpid());
+	iel_sketch_texture_path_set(path.c_str());
+	const std::vector<uint8_t> first = random_picture(589824, 1, 21, IEL_FORMAT_RGB888, 1).pixels();
+	std::vector<uint8_t> second = first;
+	second[589823] ^= 1;
+	second[0] ^= 0x80;
+	struct Step { uint32_t w, h; const std::vector<uint8_t> *content; size_t bytes; };
+	const Step steps[] = {{9, 7, &first, 589824}, {40, 3, &first, 589824}, {9, 7, &first, 589824}, {9, 2, &first, 589824},
+			      {9, 7, &first, 589824}, {3, 7, &first, 589824}, {9, 7, &first, 589824}, {1, 1, &first, 589824},
+			      {9, 7, &second, 589824}, {1, 1, &second, 589824}, {9, 7, nullptr, 0}, {9, 7, &first, 589823},
+			      {9, 7, &first, 589824}, {1, 1, &first, 589824}};
+	int n = 0;
+	for (const Step &step : steps) {
+		const std::string at = "step " + std::to_string(n++);
+		if (step.content)
+			write_file(path, *step.content, step.bytes);
+		else
+			remove(path.c_str());
+		closed_calls.clear();
+		Picture src = random_picture(step.w, step.h, 30 + n), out = zeroed_picture(step.w, step.h);
+		const bool usable = step.content && step.bytes == 589824;
+		ASSERT_EQ(IEL_Sketch(&src.record, &out.record), usable ? IEL_OK : IEL_ERR_FILE) << at;
+		if (!usable) {
+			EXPECT_TRUE(closed_calls.empty() && out.pixels() == std::vector<uint8_t>(out.size, 0)) << at;
+			continue;
+		}
+		ASSERT_EQ(closed_calls.size(), 1u) << at;
+		EXPECT_EQ(closed_calls[0].texture_pixels, scaled_texture(*step.content, step.w, step.h)) << at;
+		EXPECT_EQ(out.pixels(), closed_result_of(src.pixels())) << at;
+	}
+	remove(path.c_str());
+}
+
+/* Every picture size from one pixel up, odd widths included: the closed
+ * engine gets the picture's RGB, and its RGB comes back opaque, nothing
+ * written past the output. */
+TEST_F(Dispatch, WrappersConvertEverySize)
+{
+	for (uint32_t h = 1; h <= 5; h++)
+		for (uint32_t w = 1; w <= 37; w += (w < 12 ? 1 : 5)) {
+			Picture src = random_picture(w, h, w * 13 + h), out(w, h);
+			closed_calls.clear();
+			ASSERT_EQ(IEL_Magic_Pen(&src.record, &out.record), IEL_OK);
+			ASSERT_EQ(closed_calls.size(), 1u);
+			std::vector<uint8_t> rgb;
+			for (size_t i = 0; i < src.size; i += 4)
+				rgb.insert(rgb.end(), {src.bytes[i + 2], src.bytes[i + 1], src.bytes[i]});
+			EXPECT_EQ(closed_calls[0].input_pixels, rgb) << w << "x" << h;
+			EXPECT_TRUE(out.pixels() == closed_result_of(src.pixels()) && out.guard_intact()) << w << "x" << h;
+		}
+}
+
+/* Callers on several threads at once: one works with the kept buffers and
+ * texture, the others from scratch, and each gets its own picture's result. */
+TEST_F(Dispatch, WrappersOnSeveralThreads)
+{
+	const std::string path = "/tmp/sketch-texture-threads-" + std::to_string(getpid());
+	iel_sketch_texture_path_set(path.c_str());
+	const std::vector<uint8_t> content = random_picture(589824, 1, 41, IEL_FORMAT_RGB888, 1).pixels();
+	write_file(path, content, content.size());
+	std::vector<std::vector<uint8_t>> textures;
+	for (uint32_t t = 0; t < 4; t++)
+		textures.push_back(scaled_texture(content, 20 + t, 9 - t));
+	std::vector<std::thread> threads;
+	std::vector<int> failures(4, 0);
+	for (uint32_t t = 0; t < 4; t++)
+		threads.emplace_back([t, &failures] {
+			for (int i = 0; i < 50; i++) {
+				Picture src = random_picture(20 + t, 9 - t, t * 100 + i), out = zeroed_picture(20 + t, 9 - t);
+				const int result = i % 2 ? IEL_Sketch(&src.record, &out.record) : IEL_Cartoon(&src.record, &out.record);
+				failures[t] += result != IEL_OK || out.pixels() != closed_result_of(src.pixels());
+			}
+		});
+	for (std::thread &thread : threads)
+		thread.join();
+	remove(path.c_str());
+	EXPECT_EQ(failures, std::vector<int>(4, 0));
+	for (const ClosedCall &call : closed_calls) {
+		if (call.param.u16EffectId == IEL_EFFECT_ID_SKETCH) {
+			EXPECT_EQ(call.texture_pixels, textures[call.texture.u32Width - 20]);
+		}
+	}
 }

@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <array>
 #include <functional>
+#include <numeric>
 
 #include "engine-test-util.h"
 #include "ie-engine-private.h"
@@ -151,4 +152,29 @@ TEST(EnginePaths, SepiaEveryColour)
 	iel_sepia_reference(bytes(src), bytes(want), src.size(), 4);
 	iel_sepia_fast(bytes(src), bytes(got), src.size(), 4);
 	EXPECT_TRUE(want == got);
+}
+
+/* The wrappers' conversions for every pixel count up to a few vector steps
+ * and a long odd one: the vector loops stop short of the end and the plain
+ * loop finishes, neither reading nor writing past the last pixel (the
+ * sanitizer build sees a read; the guard bytes a write). */
+TEST(EnginePaths, RgbConversionsMatchTheirReference)
+{
+	if (!kAvx2)
+		GTEST_SKIP() << "no AVX2 on this processor";
+	std::vector<size_t> counts(41);
+	std::iota(counts.begin(), counts.end(), 0);
+	counts.push_back(1001);
+	for (size_t count : counts) {
+		const Picture bgra = random_picture(static_cast<uint32_t>(count), 1, static_cast<uint32_t>(count) + 1);
+		const std::vector<uint8_t> rgb_in(bgra.bytes.begin(), bgra.bytes.begin() + count * 3);
+		std::vector<uint8_t> want(count * 3 + kGuardBytes, kSentinel), got(want);
+		iel_bgra_to_rgb_reference(bgra.bytes.data(), want.data(), count);
+		iel_bgra_to_rgb_avx2(std::vector<uint8_t>(bgra.bytes.begin(), bgra.bytes.begin() + count * 4).data(), got.data(), count);
+		ASSERT_TRUE(want == got) << "to RGB, " << count << " pixels";
+		want.assign(count * 4 + kGuardBytes, kSentinel), got = want;
+		iel_rgb_to_opaque_bgra_reference(rgb_in.data(), want.data(), count);
+		iel_rgb_to_opaque_bgra_avx2(rgb_in.data(), got.data(), count);
+		ASSERT_TRUE(want == got) << "to BGRA, " << count << " pixels";
+	}
 }

@@ -114,6 +114,13 @@ void iel_posterize_avx2(const uint8_t *src, uint8_t *dst, size_t count, int stre
  * RES_DIR "images/sketch.raw". */
 void iel_sketch_texture_path_set(const char *path);
 
+/* The closed-engine wrappers' conversions: BGRA to the engine's RGB888, and
+ * its RGB888 back to BGRA with alpha 255. */
+void iel_bgra_to_rgb_reference(const uint8_t *bgra, uint8_t *rgb, size_t count);
+void iel_bgra_to_rgb_avx2(const uint8_t *bgra, uint8_t *rgb, size_t count);
+void iel_rgb_to_opaque_bgra_reference(const uint8_t *rgb, uint8_t *bgra, size_t count);
+void iel_rgb_to_opaque_bgra_avx2(const uint8_t *rgb, uint8_t *bgra, size_t count);
+
 #ifdef __cplusplus
 }
 #endif
