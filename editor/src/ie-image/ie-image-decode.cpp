@@ -414,6 +414,19 @@ done:
 	return status;
 }
 
+/* The records are on the heap: each holds a jump buffer and the libraries'
+ * state, and must stay put across the jump. */
+template <class Decode, class Run>
+Ie_Decode_Status decode_on_heap(Run run)
+{
+	auto *d = new (std::nothrow) Decode();
+	if (!d)
+		return Ie_Decode_Status::FAILED;
+	Ie_Decode_Status status = run(d);
+	delete d;
+	return status;
+}
+
 } // namespace
 
 bool ie_image_decode_probe(const uint8_t *data, size_t size, int *w, int *h)
@@ -431,23 +444,13 @@ Ie_Decode_Status ie_image_decode(const uint8_t *data, size_t size, int target_w,
 	*out = { nullptr, 0, 0, false };
 	if (target_w <= 0 || target_h <= 0)
 		return Ie_Decode_Status::FAILED;
-	/* The records are on the heap: each holds a jump buffer and the
-	 * libraries' state, and must stay put across the jump. */
-	if (starts_with(data, size, JPEG_START)) {
-		auto *d = new (std::nothrow) Jpeg_Decode();
-		if (!d)
-			return Ie_Decode_Status::FAILED;
-		Ie_Decode_Status status = jpeg_decode(d, data, size, target_w, target_h, stop, stop_data, out);
-		delete d;
-		return status;
-	}
-	if (starts_with(data, size, PNG_SIGNATURE)) {
-		auto *d = new (std::nothrow) Png_Decode();
-		if (!d)
-			return Ie_Decode_Status::FAILED;
-		Ie_Decode_Status status = png_decode(d, data, size, target_w, target_h, stop, stop_data, out);
-		delete d;
-		return status;
-	}
+	if (starts_with(data, size, JPEG_START))
+		return decode_on_heap<Jpeg_Decode>([&](Jpeg_Decode *d) {
+			return jpeg_decode(d, data, size, target_w, target_h, stop, stop_data, out);
+		});
+	if (starts_with(data, size, PNG_SIGNATURE))
+		return decode_on_heap<Png_Decode>([&](Png_Decode *d) {
+			return png_decode(d, data, size, target_w, target_h, stop, stop_data, out);
+		});
 	return Ie_Decode_Status::FAILED;
 }
