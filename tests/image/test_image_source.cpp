@@ -5,52 +5,21 @@
 #include <cstdlib>
 #include <string>
 
-/* libjpeg's header needs size_t and FILE declared first. */
-#include <jpeglib.h>
-
 #include "ie-image-source.h"
 #include "ie-test-harness.h"
 #include "ie-test-pictures.h"
+#include "test-jpeg-encode.h"
 
 namespace iet {
 namespace {
 
-/* Written with libjpeg itself, for the layouts Evas's saver never makes:
- * several scans, and restart markers inside the data. */
-Bytes libjpeg_picture(int w, int h, bool progressive, int restart_rows)
+/* A JPEG of several scans, or with restart markers inside its data. */
+Bytes libjpeg_picture(int w, int h, bool progressive, int restart)
 {
-	jpeg_compress_struct cinfo;
-	jpeg_error_mgr error;
-	cinfo.err = jpeg_std_error(&error);
-	jpeg_create_compress(&cinfo);
-	unsigned char *out = nullptr;
-	unsigned long size = 0;
-	jpeg_mem_dest(&cinfo, &out, &size);
-	cinfo.image_width = w;
-	cinfo.image_height = h;
-	cinfo.input_components = 3;
-	cinfo.in_color_space = JCS_RGB;
-	jpeg_set_defaults(&cinfo);
-	jpeg_set_quality(&cinfo, 90, TRUE);
-	if (progressive)
-		jpeg_simple_progression(&cinfo);
-	cinfo.restart_in_rows = restart_rows;
-	jpeg_start_compress(&cinfo, TRUE);
-	std::vector<uint8_t> row(size_t(w) * 3);
-	while (cinfo.next_scanline < cinfo.image_height) {
-		for (int x = 0; x < w; x++) {
-			row[x * 3] = uint8_t(x * 255 / w);
-			row[x * 3 + 1] = uint8_t(cinfo.next_scanline * 255 / h);
-			row[x * 3 + 2] = uint8_t(x ^ cinfo.next_scanline);
-		}
-		JSAMPROW rows[] = { row.data() };
-		jpeg_write_scanlines(&cinfo, rows, 1);
-	}
-	jpeg_finish_compress(&cinfo);
-	Bytes bytes(out, out + size);
-	free(out);
-	jpeg_destroy_compress(&cinfo);
-	return bytes;
+	Encoding e;
+	e.progressive = progressive;
+	e.restart = restart;
+	return encode(test_pixels(w, h, e.components, 1, 0), w, h, e);
 }
 
 Bytes saved_picture(const std::string &name, int w, int h)
