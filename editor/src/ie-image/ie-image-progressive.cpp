@@ -563,14 +563,19 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bi
 		uint64_t nonzero = r.nonzero, ahead = r.ahead;
 		int k = r.k;
 		const Huffman &t = *s.ac;
+		/* Each code is looked up before the reader is topped up where
+		 * enough bits are left: the top-up is then off the path from one
+		 * symbol to the next. */
+		b.refill();
+		uint32_t look = t.fast_refine[b.peek(FAST_BITS)];
 		while (ahead && st.eobrun == 0) {
-			b.refill();
-			const uint32_t symbol = read_refine_symbol(st, b, t);
+			const uint32_t symbol = look ? look : read_refine_symbol(st, b, t);
 			if (__builtin_expect(symbol <= REFINE_DAMAGED, 0)) {
 				if (symbol == REFINE_DAMAGED)
 					return false;
 				break;
 			}
+			const int step_less_at = int(symbol >> REFINE_STEP_SHIFT) - REFINE_STEP_BIAS - k;
 			const uint64_t next = nth_bit<Ops>(~nonzero & ahead, symbol & REFINE_RUN_BIT);
 			if (__builtin_expect(!next, 0)) {
 				if (symbol & REFINE_VALUE)
@@ -580,10 +585,15 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bi
 				break;
 			}
 			const int at = __builtin_ctzll(next);
-			skip_corrections(b, at - k + int(symbol >> REFINE_STEP_SHIFT) - REFINE_STEP_BIAS);
+			skip_corrections(b, at + step_less_at);
 			nonzero |= next & (0 - uint64_t((symbol & REFINE_VALUE) != 0));
 			ahead &= 0 - (next << 1);
 			k = at + 1;
+			const bool short_of_bits = b.count < FAST_BITS;
+			look = t.fast_refine[b.peek(FAST_BITS)];
+			b.refill();
+			if (__builtin_expect(short_of_bits, 0))
+				look = t.fast_refine[b.peek(FAST_BITS)];
 		}
 		r.nonzero = nonzero;
 		r.ahead = ahead;
