@@ -408,31 +408,29 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_first(Scan_State &st, Bit
 	return true;
 }
 
-/* A correction bit of a kept non-zero coefficient: a set bit adds 1 << al
- * away from zero where that bit is not yet set. */
-inline void correct_one(int16_t *coef, int bit, int p1)
+/* The bits of `v` in the reverse order. */
+inline uint64_t reverse_bits(uint64_t v)
 {
-	const int c = *coef;
-	const int apply = bit & int((c & p1) == 0);
-	*coef = int16_t(c + (apply ? (c < 0 ? -p1 : p1) : 0));
+	v = ((v >> 1) & 0x5555555555555555ull) | ((v & 0x5555555555555555ull) << 1);
+	v = ((v >> 2) & 0x3333333333333333ull) | ((v & 0x3333333333333333ull) << 2);
+	v = ((v >> 4) & 0x0F0F0F0F0F0F0F0Full) | ((v & 0x0F0F0F0F0F0F0F0Full) << 4);
+	return __builtin_bswap64(v);
 }
 
-/* One correction bit for each non-zero coefficient of `which`, all kept
- * ones, in order, taken from the reader. */
-inline void correct_kept(Bits &b, const Block &block, uint64_t which, int p1)
+/* Which places of `which` have their correction bit set, given one bit for
+ * each in order, the first at the top of `bits`. */
+template <Bit_Ops Ops> IE_ALWAYS_INLINE uint64_t corrections_set(uint64_t bits, uint64_t which)
 {
-	for (; which; which &= which - 1) {
-		b.ensure();
-		correct_one(&block.coef[__builtin_ctzll(which)], int(b.take(1)), p1);
+	if constexpr (Ops == POPCNT_PDEP) {
+		uint64_t set;
+		__asm__("pdep %2, %1, %0" : "=r"(set) : "r"(reverse_bits(bits)), "r"(which));
+		return set;
+	} else {
+		uint64_t set = 0;
+		for (; which; which &= which - 1, bits <<= 1)
+			set |= (which & (0 - which)) & (0 - (bits >> 63));
+		return set;
 	}
-}
-
-/* The same from bits at hand, the first at the top of `bits`: the reader
- * does not wait for them. */
-inline void correct_kept_at_hand(uint64_t bits, const Block &block, uint64_t which, int p1)
-{
-	for (; which; which &= which - 1, bits <<= 1)
-		correct_one(&block.coef[__builtin_ctzll(which)], int(bits >> 63), p1);
 }
 
 /* The correction bits of coefficients that are not kept: passed over, at
@@ -452,26 +450,26 @@ inline void skip_corrections(Bits &b, int n)
 }
 
 /* The corrections of the non-zero coefficients `which` (`count` of them):
- * kept ones (only near the band's start) then the rest. The `code` bits
- * of the symbol before them are still to be passed over: in the common
- * case the kept ones are read where they lie and all go in one shift. */
+ * those of kept ones (only near the band's start) noted in *corrected, the
+ * rest passed over. The `code` bits of the symbol before them are still
+ * to be passed over: in the common case the kept ones are read where they
+ * lie and all go in one shift. */
 template <Bit_Ops Ops>
-IE_ALWAYS_INLINE void correct(Bits &b, const Block &block, uint64_t kept_mask, uint64_t which, int count, int p1,
-			      int code)
+IE_ALWAYS_INLINE void correct(Bits &b, uint64_t kept_mask, uint64_t which, int count, int code, uint64_t *corrected)
 {
 	const uint64_t kept = which & kept_mask;
-	if (kept) {
-		const int n = count_bits<Ops>(kept);
-		if (code + n <= b.count) {
-			correct_kept_at_hand(b.buf << code, block, kept, p1);
-		} else {
-			b.skip(code);
-			code = 0;
-			count -= n;
-			correct_kept(b, block, kept, p1);
-		}
+	const int n = count_bits<Ops>(kept);
+	if (__builtin_expect(code + n <= b.count, 1)) {
+		*corrected |= corrections_set<Ops>(b.buf << code, kept);
+		skip_corrections(b, code + count);
+		return;
 	}
-	skip_corrections(b, code + count);
+	b.skip(code);
+	for (uint64_t rest = kept; rest; rest &= rest - 1) {
+		b.ensure();
+		*corrected |= (rest & (0 - rest)) & (0 - uint64_t(b.take(1)));
+	}
+	skip_corrections(b, count - n);
 }
 
 /* What read_refine_symbol gives for an end of band (its run of blocks
@@ -500,93 +498,62 @@ IE_ALWAYS_INLINE uint32_t read_refine_symbol(Scan_State &st, Bits &b, const Huff
 	return REFINE_END_OF_BAND;
 }
 
-/* Where a block's refinement stands: the non-zero coefficients, the
- * places still to come (a mask, from place k). */
-struct Refine_State {
-	uint64_t nonzero, ahead;
-	int k;
-};
-
 /* Correction bits go to the coefficients already non-zero; a new
  * coefficient (of magnitude 1 << al) goes to the zero one that the run of
- * zeros ends on. The corrections passed are the places from k to the
- * run's end that are not its zeros, so the reader's step follows from
- * where the run ends without counting them. This is the part of the band
- * where the kept coefficients lie; false on damage. */
+ * zeros ends on. The places still to come are a mask (`ahead`) from place
+ * k; the corrections passed are the places from k to the run's end that
+ * are not its zeros, so the reader's step follows from where the run ends
+ * without counting them. Two loops: one while the kept coefficients lie
+ * ahead, which notes their corrections and new values as masks (put in
+ * place once the block is read), then one where only the mask of non-zero
+ * coefficients changes, with the fewest values live (most of a progressive
+ * file's bits are there). Each code is looked up before the reader is
+ * topped up where enough bits are left: the top-up is then off the path
+ * from one symbol to the next. A set correction bit adds 1 << al away
+ * from zero where that bit is not yet set. False on damage. */
 template <Bit_Ops Ops>
-__attribute__((noinline)) bool refine_kept(Scan_State &st, Bits &b, const Scan &s, const Block &block, Refine_State &r)
+__attribute__((noinline)) bool decode_ac_refine(Scan_State &st, Bits &b_io, const Scan &s, const Block &block)
 {
-	const int p1 = 1 << s.al;
 	const uint64_t kept_mask = block.kept >= 64 ? ~0ull : (1ull << block.kept) - 1;
 	const Huffman &t = *s.ac;
-	while (r.ahead && r.k < block.kept) {
-		/* Enough for the code, its bits and most corrections. */
-		b.fill();
-		const uint32_t symbol = read_refine_symbol(st, b, t);
-		if (symbol <= REFINE_DAMAGED)
-			return symbol != REFINE_DAMAGED;
-		/* Past the run of zeros to the next one (`next`, a single bit), or
-		 * off the band (0, for a run of zeros only). */
-		const uint64_t next = nth_bit<Ops>(~r.nonzero & r.ahead, symbol & REFINE_RUN_BIT);
-		const int length = refine_length(symbol);
-		if (!next) {
-			if (symbol & REFINE_VALUE)
-				return false;
-			const uint64_t rest = r.nonzero & r.ahead;
-			correct<Ops>(b, block, kept_mask, rest, count_bits<Ops>(rest), p1, length);
-			r.ahead = 0;
-			return true;
-		}
-		const int at = __builtin_ctzll(next);
-		const int step = at - r.k + int(symbol >> REFINE_STEP_SHIFT) - REFINE_STEP_BIAS;
-		correct<Ops>(b, block, kept_mask, r.nonzero & r.ahead & (next - 1), step - length, p1, length);
-		if (symbol & REFINE_VALUE) {
-			if (next & kept_mask)
-				block.coef[at] = int16_t(symbol & REFINE_NEGATIVE ? -p1 : p1);
-			r.nonzero |= next;
-		}
-		r.ahead &= 0 - (next << 1);
-		r.k = at + 1;
-	}
-	return true;
-}
-
-/* A block of a refinement scan: its kept coefficients above, then the
- * rest of the band, where only the mask changes, in a loop with the
- * fewest values live (most of a progressive file's bits are there). */
-template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bits &b, const Scan &s, const Block &block)
-{
-	Refine_State r = { *block.nonzero, band(s.ss, s.se), s.ss };
+	Bits b = b_io;
+	uint64_t nonzero = *block.nonzero, ahead = band(s.ss, s.se);
+	uint64_t corrected = 0, added = 0, negative = 0;
+	int k = s.ss;
+	bool ok = true;
 	if (st.eobrun == 0) {
-		if (r.k < block.kept && !refine_kept<Ops>(st, b, s, block, r))
-			return false;
-		uint64_t nonzero = r.nonzero, ahead = r.ahead;
-		int k = r.k;
-		const Huffman &t = *s.ac;
-		/* Each code is looked up before the reader is topped up where
-		 * enough bits are left: the top-up is then off the path from one
-		 * symbol to the next. */
 		b.refill();
 		uint32_t look = t.fast_refine[b.peek(FAST_BITS)];
-		while (ahead && st.eobrun == 0) {
+		for (bool kept_ahead = k < block.kept; ahead;) {
 			const uint32_t symbol = look ? look : read_refine_symbol(st, b, t);
 			if (__builtin_expect(symbol <= REFINE_DAMAGED, 0)) {
-				if (symbol == REFINE_DAMAGED)
-					return false;
+				ok = symbol != REFINE_DAMAGED;
 				break;
 			}
 			const int step_less_at = int(symbol >> REFINE_STEP_SHIFT) - REFINE_STEP_BIAS - k;
+			/* Past the run of zeros to the next one (`next`, a single
+			 * bit), or off the band (0, for a run of zeros only). */
 			const uint64_t next = nth_bit<Ops>(~nonzero & ahead, symbol & REFINE_RUN_BIT);
 			if (__builtin_expect(!next, 0)) {
-				if (symbol & REFINE_VALUE)
-					return false;
-				skip_corrections(b, refine_length(symbol) + count_bits<Ops>(nonzero & ahead));
+				ok = !(symbol & REFINE_VALUE);
+				const uint64_t rest = nonzero & ahead;
+				correct<Ops>(b, kept_mask, rest, count_bits<Ops>(rest), refine_length(symbol), &corrected);
 				ahead = 0;
 				break;
 			}
 			const int at = __builtin_ctzll(next);
-			skip_corrections(b, at + step_less_at);
-			nonzero |= next & (0 - uint64_t((symbol & REFINE_VALUE) != 0));
+			const uint64_t value = next & (0 - uint64_t((symbol & REFINE_VALUE) != 0));
+			if (kept_ahead) {
+				const int length = refine_length(symbol);
+				correct<Ops>(b, kept_mask, nonzero & ahead & (next - 1), at + step_less_at - length, length,
+					     &corrected);
+				added |= value & kept_mask;
+				negative |= value & kept_mask & (0 - uint64_t((symbol & REFINE_NEGATIVE) != 0));
+				kept_ahead = at + 1 < block.kept;
+			} else {
+				skip_corrections(b, at + step_less_at);
+			}
+			nonzero |= value;
 			ahead &= 0 - (next << 1);
 			k = at + 1;
 			const bool short_of_bits = b.count < FAST_BITS;
@@ -595,19 +562,26 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bi
 			if (__builtin_expect(short_of_bits, 0))
 				look = t.fast_refine[b.peek(FAST_BITS)];
 		}
-		r.nonzero = nonzero;
-		r.ahead = ahead;
 	}
-	if (st.eobrun > 0) {
+	if (ok && st.eobrun > 0) {
 		b.fill();
-		const int p1 = 1 << s.al;
-		const uint64_t kept_mask = block.kept >= 64 ? ~0ull : (1ull << block.kept) - 1;
-		const uint64_t rest = r.nonzero & r.ahead;
-		correct<Ops>(b, block, kept_mask, rest, count_bits<Ops>(rest), p1, 0);
+		const uint64_t rest = nonzero & ahead;
+		correct<Ops>(b, kept_mask, rest, count_bits<Ops>(rest), 0, &corrected);
 		st.eobrun--;
 	}
-	*block.nonzero = r.nonzero;
-	return true;
+	*block.nonzero = nonzero;
+	const int p1 = 1 << s.al;
+	for (; corrected; corrected &= corrected - 1) {
+		int16_t &coef = block.coef[__builtin_ctzll(corrected)];
+		if ((coef & p1) == 0)
+			coef = int16_t(coef + (coef < 0 ? -p1 : p1));
+	}
+	for (; added; added &= added - 1) {
+		const int at = __builtin_ctzll(added);
+		block.coef[at] = int16_t((negative >> at) & 1 ? -p1 : p1);
+	}
+	b_io = b;
+	return ok;
 }
 
 /* The end of the entropy-coded bytes from `p`: the next marker other than
