@@ -9,7 +9,9 @@
  * that follows it in one look-up, and from keeping, beside the few
  * coefficients the reduced inverse DCT reads, only a mask of which
  * coefficients are non-zero: the refinement scans, most of a progressive
- * file, then pass over the correction bits of the others in bulk. */
+ * file, then pass over the correction bits of the others in bulk, by a
+ * step that follows from where each run of zeros ends, and look the next
+ * code up before the reader is topped up. */
 #include "ie-image-progressive.h"
 
 #include <algorithm>
