@@ -9,7 +9,9 @@
  * that follows it in one look-up, and from keeping, beside the few
  * coefficients the reduced inverse DCT reads, only a mask of which
  * coefficients are non-zero: the refinement scans, most of a progressive
- * file, then pass over the correction bits of the others in bulk. */
+ * file, then pass over the correction bits of the others in bulk, by a
+ * step that follows from where each run of zeros ends, and look the next
+ * code up before the reader is topped up. */
 #include "ie-image-progressive.h"
 
 #include <algorithm>
@@ -52,6 +54,8 @@ struct Bits {
 
 	Bits(const uint8_t *from, const uint8_t *to) : p(from), end(to) {}
 
+	/* Tops up to at least 56 bits whatever the count (from 0 to 63):
+	 * where no branch on the count is wanted. */
 	void refill()
 	{
 		if (end - p >= 8) {
@@ -64,7 +68,7 @@ struct Bits {
 				return;
 			}
 		}
-		while (count <= 56) {
+		while (count < 56) {
 			uint64_t byte = 0;
 			if (p < end) {
 				byte = *p++;
@@ -113,7 +117,28 @@ inline int extend(uint32_t v, int s)
 /* ---- Huffman ---- */
 
 constexpr int FAST_BITS = 10;
-constexpr uint16_t REFINE_VALUE = 1 << 12, REFINE_NEGATIVE = 1 << 13, REFINE_END_OF_BAND = 1 << 14;
+
+/* A refinement symbol as one word: the bit of its zero run (1 << run),
+ * the bits still to pass over after its code is looked up (the code and
+ * the sign), whether a new coefficient comes and its sign, and that
+ * length less the run (biased by 32): with the place the run ends on,
+ * the loop knows how far the bit reader moves without counting the
+ * corrections in between. */
+constexpr uint32_t REFINE_RUN_BIT = 0xFFFF;
+constexpr int REFINE_LENGTH_SHIFT = 16;
+constexpr uint32_t REFINE_VALUE = 1u << 21, REFINE_NEGATIVE = 1u << 22;
+constexpr int REFINE_STEP_SHIFT = 24, REFINE_STEP_BIAS = 32;
+
+constexpr uint32_t refine_symbol(int run, int length, bool value, bool negative)
+{
+	return uint32_t(1) << run | uint32_t(length) << REFINE_LENGTH_SHIFT | (value ? REFINE_VALUE : 0) |
+	       (negative ? REFINE_NEGATIVE : 0) | uint32_t(length - run + REFINE_STEP_BIAS) << REFINE_STEP_SHIFT;
+}
+
+inline int refine_length(uint32_t symbol)
+{
+	return int(symbol >> REFINE_LENGTH_SHIFT) & 31;
+}
 
 struct Huffman {
 	/* By the next FAST_BITS bits: code length << 8 | symbol; 0 for a
@@ -122,9 +147,9 @@ struct Huffman {
 	/* AC tables: the code and the value after it, when both fit: value
 	 * (16 bits), zero run (4), total length (5). 0 when they do not. */
 	int32_t fast_ac[1 << FAST_BITS];
-	/* The same for refinement scans, whose values are one sign bit:
-	 * length (5 bits), run (4 bits from bit 8) and the REFINE_* flags. */
-	uint16_t fast_refine[1 << FAST_BITS];
+	/* The same for refinement scans, whose values are one sign bit, as
+	 * refine_symbol() words; 0 for an end of band or a code too long. */
+	uint32_t fast_refine[1 << FAST_BITS];
 	/* First code of each length after the last one, left-aligned to 17
 	 * bits (so that a length with no codes is never chosen). */
 	uint32_t limit[18];
@@ -174,14 +199,10 @@ bool huffman_build(Huffman *t, const uint8_t counts[16], const uint8_t *values, 
 		for (uint32_t look = 0; look < (1u << FAST_BITS); look++) {
 			const uint16_t e = t->fast[look];
 			const int len = e >> 8, symbol = e & 0xFF, run = symbol >> 4, size = symbol & 15;
-			if (!e || size > 1 || len + size > FAST_BITS)
+			if (!e || size > 1 || len + size > FAST_BITS || (!size && run != 15))
 				continue;
-			uint16_t entry = uint16_t(len + size) | uint16_t(run << 8);
-			if (size)
-				entry |= REFINE_VALUE | ((look >> (FAST_BITS - len - 1)) & 1 ? 0 : REFINE_NEGATIVE);
-			else if (run != 15)
-				entry |= REFINE_END_OF_BAND;
-			t->fast_refine[look] = entry;
+			const bool negative = size && !((look >> (FAST_BITS - len - 1)) & 1);
+			t->fast_refine[look] = refine_symbol(run, len + size, size, negative);
 		}
 	}
 	return true;
@@ -293,15 +314,16 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE int count_bits(uint64_t v)
 	}
 }
 
-/* The lowest set bit of `v` after the first `n`, alone; 0 if there is none. */
-template <Bit_Ops Ops> IE_ALWAYS_INLINE uint64_t nth_bit(uint64_t v, int n)
+/* The lowest set bit of `v` after the first n, alone, where `n_bit` is
+ * 1 << n; 0 if there is none. */
+template <Bit_Ops Ops> IE_ALWAYS_INLINE uint64_t nth_bit(uint64_t v, uint64_t n_bit)
 {
 	if constexpr (Ops == POPCNT_PDEP) {
 		uint64_t bit;
-		__asm__("pdep %2, %1, %0" : "=r"(bit) : "r"(1ull << n), "r"(v));
+		__asm__("pdep %2, %1, %0" : "=r"(bit) : "r"(n_bit), "r"(v));
 		return bit;
 	} else {
-		for (int i = 0; i < n; i++)
+		for (int i = __builtin_ctzll(n_bit); i > 0; i--)
 			v &= v - 1;
 		return v & (0 - v);
 	}
@@ -388,18 +410,28 @@ template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_first(Scan_State &st, Bit
 	return true;
 }
 
-/* One correction bit for each non-zero coefficient of `which`, all kept
- * ones, in order: a set bit adds 1 << al away from zero where that bit is
- * not yet set. */
-inline void correct_kept(Bits &b, const Block &block, uint64_t which, int p1)
+/* The bits of `v` in the reverse order. */
+inline uint64_t reverse_bits(uint64_t v)
 {
-	for (; which; which &= which - 1) {
-		const int j = __builtin_ctzll(which);
-		b.ensure();
-		const int bit = int(b.take(1));
-		const int c = block.coef[j];
-		const int apply = bit & int((c & p1) == 0);
-		block.coef[j] = int16_t(c + (apply ? (c < 0 ? -p1 : p1) : 0));
+	v = ((v >> 1) & 0x5555555555555555ull) | ((v & 0x5555555555555555ull) << 1);
+	v = ((v >> 2) & 0x3333333333333333ull) | ((v & 0x3333333333333333ull) << 2);
+	v = ((v >> 4) & 0x0F0F0F0F0F0F0F0Full) | ((v & 0x0F0F0F0F0F0F0F0Full) << 4);
+	return __builtin_bswap64(v);
+}
+
+/* Which places of `which` have their correction bit set, given one bit for
+ * each in order, the first at the top of `bits`. */
+template <Bit_Ops Ops> IE_ALWAYS_INLINE uint64_t corrections_set(uint64_t bits, uint64_t which)
+{
+	if constexpr (Ops == POPCNT_PDEP) {
+		uint64_t set;
+		__asm__("pdep %2, %1, %0" : "=r"(set) : "r"(reverse_bits(bits)), "r"(which));
+		return set;
+	} else {
+		uint64_t set = 0;
+		for (; which; which &= which - 1, bits <<= 1)
+			set |= (which & (0 - which)) & (0 - (bits >> 63));
+		return set;
 	}
 }
 
@@ -420,84 +452,138 @@ inline void skip_corrections(Bits &b, int n)
 }
 
 /* The corrections of the non-zero coefficients `which` (`count` of them):
- * kept ones (only near the band's start) then the rest. The `code` bits
- * of the symbol before them are still to be passed over: in the common
- * case both go in one shift. */
+ * those of kept ones (only near the band's start) noted in *corrected, the
+ * rest passed over. The `code` bits of the symbol before them are still
+ * to be passed over: in the common case the kept ones are read where they
+ * lie and all go in one shift. */
 template <Bit_Ops Ops>
-IE_ALWAYS_INLINE void correct(Bits &b, const Block &block, uint64_t kept_mask, uint64_t which, int count, int p1,
-			      int code)
+IE_ALWAYS_INLINE void correct(Bits &b, uint64_t kept_mask, uint64_t which, int count, int code, uint64_t *corrected)
 {
 	const uint64_t kept = which & kept_mask;
-	if (kept) {
-		b.skip(code);
-		code = 0;
-		count -= count_bits<Ops>(kept);
-		correct_kept(b, block, kept, p1);
+	const int n = count_bits<Ops>(kept);
+	if (__builtin_expect(code + n <= b.count, 1)) {
+		*corrected |= corrections_set<Ops>(b.buf << code, kept);
+		skip_corrections(b, code + count);
+		return;
 	}
-	skip_corrections(b, code + count);
+	b.skip(code);
+	for (uint64_t rest = kept; rest; rest &= rest - 1) {
+		b.ensure();
+		*corrected |= (rest & (0 - rest)) & (0 - uint64_t(b.take(1)));
+	}
+	skip_corrections(b, count - n);
+}
+
+/* What read_refine_symbol gives for an end of band (its run of blocks
+ * read) and for damage; every symbol is above both. */
+constexpr uint32_t REFINE_END_OF_BAND = 0, REFINE_DAMAGED = 1;
+
+/* The next refinement symbol as refine_symbol() has it, with fill() done.
+ * Long codes and ends of band are decoded into the same form, their bits
+ * taken. */
+IE_ALWAYS_INLINE uint32_t read_refine_symbol(Scan_State &st, Bits &b, const Huffman &t)
+{
+	const uint32_t symbol = t.fast_refine[b.peek(FAST_BITS)];
+	if (symbol)
+		return symbol;
+	const int rs = huffman_decode(b, t);
+	if (rs < 0)
+		return REFINE_DAMAGED;
+	const int run = rs >> 4, size = rs & 15;
+	if (size)
+		return size == 1 ? refine_symbol(run, 0, true, !b.take(1)) : REFINE_DAMAGED;
+	if (run == 15)
+		return refine_symbol(run, 0, false, false);
+	st.eobrun = 1u << run;
+	if (run)
+		st.eobrun += b.take(run);
+	return REFINE_END_OF_BAND;
 }
 
 /* Correction bits go to the coefficients already non-zero; a new
  * coefficient (of magnitude 1 << al) goes to the zero one that the run of
- * zeros ends on. The places still to come are a mask (`ahead`) rather than
- * an index, which keeps the loop's state in registers. */
-template <Bit_Ops Ops> IE_ALWAYS_INLINE bool decode_ac_refine(Scan_State &st, Bits &b, const Scan &s, const Block &block)
+ * zeros ends on. The places still to come are a mask (`ahead`) from place
+ * k; the corrections passed are the places from k to the run's end that
+ * are not its zeros, so the reader's step follows from where the run ends
+ * without counting them. Two loops: one while the kept coefficients lie
+ * ahead, which notes their corrections and new values as masks (put in
+ * place once the block is read), then one where only the mask of non-zero
+ * coefficients changes, with the fewest values live (most of a progressive
+ * file's bits are there). Each code is looked up before the reader is
+ * topped up where enough bits are left: the top-up is then off the path
+ * from one symbol to the next. A set correction bit adds 1 << al away
+ * from zero where that bit is not yet set. False on damage. */
+template <Bit_Ops Ops>
+__attribute__((noinline)) bool decode_ac_refine(Scan_State &st, Bits &b_io, const Scan &s, const Block &block)
 {
-	const int p1 = 1 << s.al;
 	const uint64_t kept_mask = block.kept >= 64 ? ~0ull : (1ull << block.kept) - 1;
-	uint64_t nonzero = *block.nonzero;
-	uint64_t ahead = band(s.ss, s.se);
+	const Huffman &t = *s.ac;
+	Bits b = b_io;
+	uint64_t nonzero = *block.nonzero, ahead = band(s.ss, s.se);
+	uint64_t corrected = 0, added = 0, negative = 0;
+	int k = s.ss;
+	bool ok = true;
 	if (st.eobrun == 0) {
-		const Huffman &t = *s.ac;
-		while (ahead) {
-			/* Enough for the code, its bits and most corrections. */
-			b.fill();
-			/* The symbol as the one-look-up table has it: code length,
-			 * run, whether a new coefficient comes and its sign. Long
-			 * codes are decoded into the same form, their bits taken. */
-			uint16_t symbol = t.fast_refine[b.peek(FAST_BITS)];
-			if (!symbol || (symbol & REFINE_END_OF_BAND)) {
-				const int rs = huffman_decode(b, t);
-				if (rs < 0)
-					return false;
-				const int run = rs >> 4, size = rs & 15;
-				if (size) {
-					if (size != 1)
-						return false;
-					symbol = uint16_t(REFINE_VALUE | (b.take(1) ? 0 : REFINE_NEGATIVE) | run << 8);
-				} else if (run != 15) {
-					st.eobrun = 1u << run;
-					if (run)
-						st.eobrun += b.take(run);
-					break;
-				} else {
-					symbol = uint16_t(run << 8);
-				}
+		b.refill();
+		uint32_t look = t.fast_refine[b.peek(FAST_BITS)];
+		for (bool kept_ahead = k < block.kept; ahead;) {
+			const uint32_t symbol = look ? look : read_refine_symbol(st, b, t);
+			if (__builtin_expect(symbol <= REFINE_DAMAGED, 0)) {
+				ok = symbol != REFINE_DAMAGED;
+				break;
 			}
+			const int step_less_at = int(symbol >> REFINE_STEP_SHIFT) - REFINE_STEP_BIAS - k;
 			/* Past the run of zeros to the next one (`next`, a single
-			 * bit), or off the band (0); the places passed that are not
-			 * zeros hold corrections. */
-			const uint64_t next = nth_bit<Ops>(~nonzero & ahead, (symbol >> 8) & 15);
-			const uint64_t passed = nonzero & ahead & (next - 1);
-			correct<Ops>(b, block, kept_mask, passed, count_bits<Ops>(passed), p1, symbol & 31);
-			if (symbol & REFINE_VALUE) {
-				if (!next)
-					return false;
-				if (next & kept_mask)
-					block.coef[__builtin_ctzll(next)] = int16_t(symbol & REFINE_NEGATIVE ? -p1 : p1);
-				nonzero |= next;
+			 * bit), or off the band (0, for a run of zeros only). */
+			const uint64_t next = nth_bit<Ops>(~nonzero & ahead, symbol & REFINE_RUN_BIT);
+			if (__builtin_expect(!next, 0)) {
+				ok = !(symbol & REFINE_VALUE);
+				const uint64_t rest = nonzero & ahead;
+				correct<Ops>(b, kept_mask, rest, count_bits<Ops>(rest), refine_length(symbol), &corrected);
+				ahead = 0;
+				break;
 			}
-			ahead &= ~(next | (next - 1));
+			const int at = __builtin_ctzll(next);
+			const uint64_t value = next & (0 - uint64_t((symbol & REFINE_VALUE) != 0));
+			if (kept_ahead) {
+				const int length = refine_length(symbol);
+				correct<Ops>(b, kept_mask, nonzero & ahead & (next - 1), at + step_less_at - length, length,
+					     &corrected);
+				added |= value & kept_mask;
+				negative |= value & kept_mask & (0 - uint64_t((symbol & REFINE_NEGATIVE) != 0));
+				kept_ahead = at + 1 < block.kept;
+			} else {
+				skip_corrections(b, at + step_less_at);
+			}
+			nonzero |= value;
+			ahead &= 0 - (next << 1);
+			k = at + 1;
+			const bool short_of_bits = b.count < FAST_BITS;
+			look = t.fast_refine[b.peek(FAST_BITS)];
+			b.refill();
+			if (__builtin_expect(short_of_bits, 0))
+				look = t.fast_refine[b.peek(FAST_BITS)];
 		}
 	}
-	if (st.eobrun > 0) {
+	if (ok && st.eobrun > 0) {
 		b.fill();
 		const uint64_t rest = nonzero & ahead;
-		correct<Ops>(b, block, kept_mask, rest, count_bits<Ops>(rest), p1, 0);
+		correct<Ops>(b, kept_mask, rest, count_bits<Ops>(rest), 0, &corrected);
 		st.eobrun--;
 	}
 	*block.nonzero = nonzero;
-	return true;
+	const int p1 = 1 << s.al;
+	for (; corrected; corrected &= corrected - 1) {
+		int16_t &coef = block.coef[__builtin_ctzll(corrected)];
+		if ((coef & p1) == 0)
+			coef = int16_t(coef + (coef < 0 ? -p1 : p1));
+	}
+	for (; added; added &= added - 1) {
+		const int at = __builtin_ctzll(added);
+		block.coef[at] = int16_t((negative >> at) & 1 ? -p1 : p1);
+	}
+	b_io = b;
+	return ok;
 }
 
 /* The end of the entropy-coded bytes from `p`: the next marker other than
