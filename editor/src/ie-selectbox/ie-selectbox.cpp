@@ -197,7 +197,7 @@ void layout_members(Selectbox_Smart_Data *sd)
 {
 	/* The bands reach the canvas edges, whatever the box's own size. */
 	Selectbox_Layout lay = {sd->left, sd->top, sd->right, sd->bottom, 0, 0};
-	evas_output_size_get(evas_object_evas_get(sd->obj), &lay.canvas_w, &lay.canvas_h);
+	evas_output_size_get(sd->canvas, &lay.canvas_w, &lay.canvas_h);
 	const bool all = !sd->laid_out;
 	const Member_Places to = member_places(lay);
 	const Member_Places from = all ? to : member_places(sd->laid);
@@ -341,6 +341,7 @@ static void _selectbox_smart_add(Evas_Object *obj)
 	evas_object_smart_data_set(obj, sd);
 	sd->obj = obj;
 	Evas *canvas = evas_object_evas_get(obj);
+	sd->canvas = canvas;
 
 	for (Evas_Object *&shade : sd->shades) {
 		shade = evas_object_rectangle_add(canvas);
