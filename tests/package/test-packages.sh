@@ -51,13 +51,20 @@ build_and_install() {
 	for tool in dpkg-deb dpkg-shlibdeps cpack file apt-get; do
 		command -v $tool >/dev/null || skip "$tool is not installed: the packages cannot be built here"
 	done
+	# A packaging build cut off (by this test's timeout) can leave a
+	# truncated object newer than its source, which the next build would
+	# link as it is: a build that did not finish is started afresh.
+	local unfinished=$work/build-unfinished
+	[ -e "$unfinished" ] && rm -rf "$work/build"
 	mkdir -p "$work/debs" "$root"
+	touch "$unfinished"
 	local listing
 	listing=$(IE_PACKAGE_BUILD_DIR=$work/build "$source/ie" package "$work/debs" 2>&1) || {
 		echo "$listing"
 		fail "./ie package failed"
 		finish
 	}
+	rm -f "$unfinished"
 	echo "$listing" | tail -n 4
 
 	# The four packages, and what `ie package` printed is what it built.
