@@ -744,8 +744,10 @@ Eina_Bool ie_image_pixels_take(Evas_Object *obj, void *pixels, int w, int h)
 	_picture_drop(sd, pixels);
 	Evas_Object *image = sd->image;
 	evas_object_image_size_set(image, w, h);
-	/* Evas reads the rows at its own stride. */
-	if (w <= 0 || h <= 0 || evas_object_image_stride_get(image) != w * 4) {
+	/* Evas reads the rows at its own stride, which it reports cut to 16
+	 * bits: a picture 8192 or more pixels wide shows only the low half. */
+	const int stride = evas_object_image_stride_get(image);
+	if (w <= 0 || h <= 0 || (stride & 0xffff) != ((w * 4) & 0xffff)) {
 		IE_LOG_E("Cannot show a %dx%d picture", w, h);
 		return EINA_FALSE;
 	}
