@@ -334,6 +334,67 @@ TEST_F(CropView, ASecondCropCutsTheCroppedPictureWhereItLies)
 	expect_saved_as(close_requests[0], expected, cw, ch);
 }
 
+/* However the picture came to be on screen (opened at its own size, turned,
+ * or with an effect on it), Done's crop cuts the shown pixels where they
+ * lie, Cancel in the crop view leaves them as they are, and the next Done
+ * saves the cut. */
+TEST_F(CropView, EveryPictureIsCutWhereItLiesAndSaved)
+{
+	constexpr int TOOL_ROTATE_RIGHT = 2, TOOL_EFFECT = 3;
+	const struct {
+		const char *name;
+		int tool;
+	} ways[] = {{"opened at its own size", -1}, {"turned", TOOL_ROTATE_RIGHT}, {"with an effect", TOOL_EFFECT}};
+	for (const auto &way : ways) {
+		SCOPED_TRACE(way.name);
+		/* Wide enough for the effect strip to show its first item. */
+		if (way.tool == TOOL_EFFECT)
+			resize_window(2600, 1280);
+		ASSERT_NE(open_editor_on_picture(640, 480), nullptr);
+		const auto opened = picture_pixels();
+		if (way.tool >= 0)
+			tap_tool(way.tool);
+		if (way.tool == TOOL_EFFECT) {
+			iet::run_idlers();
+			ASSERT_NE(vh->effect_grid, nullptr);
+			tap_item(elm_gengrid_first_item_get(vh->effect_grid));
+			iet::run_idlers();
+		}
+		const auto before = picture_pixels();
+		EXPECT_EQ(before != opened, way.tool >= 0);
+		int w, h;
+		picture_size(&w, &h);
+
+		open_crop();
+		drag_box(0.0, 0.0, 60, 40);
+		tap_button(vh->cancel_btn);
+		int cancelled_w, cancelled_h;
+		picture_size(&cancelled_w, &cancelled_h);
+		EXPECT_EQ(cancelled_w, w);
+		EXPECT_EQ(cancelled_h, h);
+		EXPECT_TRUE(picture_pixels() == before);
+
+		const void *buffer = evas_object_image_data_get(inner_image(), EINA_FALSE);
+		open_crop();
+		drag_box(1.0, 1.0, -100, -60);
+		int cw, ch;
+		const auto expected = expected_crop(region(), &cw, &ch);
+		tap_button(vh->done_btn);
+		picture_size(&w, &h);
+		ASSERT_EQ(w, cw);
+		ASSERT_EQ(h, ch);
+		EXPECT_TRUE(picture_pixels() == expected);
+		EXPECT_EQ(evas_object_image_data_get(inner_image(), EINA_FALSE), buffer) << "no new memory";
+
+		tap_button(vh->done_btn);
+		ASSERT_TRUE(wait_for_close());
+		ASSERT_EQ(close_requests.size(), 1u);
+		expect_saved_as(close_requests[0], expected, cw, ch);
+		destroy_editor();
+		close_requests.clear();
+	}
+}
+
 TEST_F(CropView, AnAppliedCropIsNeverForgotten)
 {
 	ASSERT_NE(open_editor_on_picture(640, 480), nullptr);

@@ -223,6 +223,9 @@ TEST_F(MainImageLoad, ReducesToTheBoxAtOnceOrBehindThePopup)
 			popups_deleted = 0;
 		}
 		EXPECT_EQ(pixel_size(), (Rect{ 0, 0, c.w, c.h }));
+		/* Every way in leaves the picture in the main image's own buffer,
+		 * which the views rework in place. */
+		EXPECT_TRUE(ie_image_pixels_owned(obj_, evas_object_image_data_get(sd()->image, EINA_FALSE)));
 		/* 6 turns clockwise: the marked corner goes to the top right;
 		 * 8 the other way: to the bottom left. */
 		if (c.path == gif)

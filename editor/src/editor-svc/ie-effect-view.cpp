@@ -94,32 +94,14 @@ size_t picture_bytes(const Viewhandle *vh)
 	return static_cast<size_t>(vh->image_width) * vh->image_height * 4;
 }
 
-/* The picture's pixels at the size of orig_buf, for writing all of them.
- * Pixels of our own at that size are written in place; a picture still
- * held as its file's pixels, or shrunk by the preview, gets a buffer of its
- * own. */
+/* The picture's pixels at the size of orig_buf, for writing all of them:
+ * the main image's own buffer, written in place when the picture already
+ * lies in it at that size. A picture Evas holds, or one shrunk by the
+ * preview, is replaced by a new buffer of the main image's, so that a crop
+ * after the effect also works in place. */
 unsigned char *picture_pixels_reset(Viewhandle *vh)
 {
-	Evas_Object *inner = ie_image_object_get(vh->main_image);
-	if (!inner)
-		return NULL;
-	int w = 0, h = 0;
-	evas_object_image_size_get(inner, &w, &h);
-	const char *file = NULL;
-	evas_object_image_file_get(inner, &file, NULL);
-	if (file) {
-		/* Writes into a file's cached pixels do not reach the screen. */
-		evas_object_image_file_set(inner, NULL, NULL);
-		w = h = 0;
-	}
-	if (w != vh->image_width || h != vh->image_height) {
-		evas_object_image_data_set(inner, NULL);
-		evas_object_image_size_set(inner, vh->image_width, vh->image_height);
-	}
-	auto *pixels = static_cast<unsigned char *>(evas_object_image_data_get(inner, EINA_TRUE));
-	if (!pixels)
-		IE_LOG_E("evas_object_image_data_get Failed ");
-	return pixels;
+	return static_cast<unsigned char *>(ie_image_own_pixels_get(vh->main_image, vh->image_width, vh->image_height));
 }
 
 void picture_pixels_commit(Viewhandle *vh, unsigned char *pixels, int w, int h)

@@ -1,10 +1,9 @@
 /* The rotate view: each pick of a rotate tool turns the picture a quarter
  * turn at once (direction 1 right, 3 left) and fits it anew. */
-#include <memory>
-
 #include "editor-svc-private.h"
 #include "ie-engine.h"
 #include "ie-image.h"
+#include "ie-malloc-ptr.h"
 
 static void apply_rotate_effect(Viewhandle *vh, int direction)
 {
@@ -16,28 +15,25 @@ static void apply_rotate_effect(Viewhandle *vh, int direction)
 		IE_LOG_E("Image Internal Buffer Get Failed");
 		return;
 	}
+	/* The turn writes every byte of a buffer the main image then takes
+	 * over as it is: no copy into Evas's buffer, and a later crop works
+	 * within it. */
 	size_t bytes = static_cast<size_t>(w) * h * 4;
-	std::unique_ptr<uint8_t, decltype(&free)> rotated(static_cast<uint8_t *>(calloc(bytes, 1)), free);
+	Ie_Malloc_Ptr<uint8_t> rotated(static_cast<uint8_t *>(malloc(bytes)));
 	if (!rotated) {
 		IE_LOG_E("Calloc Failed, Failed to apply effect ");
 		return;
 	}
 	IEL_Image source = {static_cast<uint32_t>(w), static_cast<uint32_t>(h), IEL_FORMAT_BGRA8888, pixels};
 	IEL_Image output = {static_cast<uint32_t>(w), static_cast<uint32_t>(h), IEL_FORMAT_BGRA8888, rotated.get()};
-	IEL_Rotate_Image(&source, &output, static_cast<unsigned int>(direction));
-
-	evas_object_image_data_set(inner, NULL);
-	evas_object_image_size_set(inner, h, w);
-	void *target = evas_object_image_data_get(inner, EINA_TRUE);
-	if (!target) {
-		IE_LOG_E("evas_object_image_data_get Failed ");
+	if (IEL_Rotate_Image(&source, &output, static_cast<unsigned int>(direction)) != IEL_OK) {
+		IE_LOG_E("the picture cannot be turned");
 		return;
 	}
-	memcpy(target, rotated.get(), bytes);
-	evas_object_image_data_set(inner, target);
-	evas_object_image_data_update_add(inner, 0, 0, h, w);
-
+	const Eina_Bool shown = ie_image_pixels_take(vh->main_image, rotated.release(), h, w);
 	ie_image_size_update(vh->main_image);
+	if (!shown)
+		return;
 	vh->edited = EINA_TRUE;
 	vh->rotated = EINA_TRUE;
 }

@@ -236,32 +236,21 @@ static Evas_Object_Ptr _probe_open(Evas_Object *obj, const Ie_Image_Source &sour
 	return probe;
 }
 
-/* Upright as stored: the image keeps the file and decodes it in place.
- * Otherwise a probe decodes it and the turn puts it into the image. */
+/* A probe decodes the file and the turn (a plain copy for an upright
+ * picture) puts it into the main image's own buffer, where the views
+ * rework it in place instead of trading Evas's buffers. */
 static bool _load_full_size(Mainimg_Smart_Data *sd, Evas_Object_Ptr probe, const Ie_Image_Source &source,
 			    const Load_Plan &plan)
 {
-	if (plan.orientation == UPRIGHT) {
-		_image_source_set(sd->image, source);
-		const void *pixels = _image_pixels_decode(sd->image);
-		if (!pixels) {
-			evas_object_image_file_set(sd->image, NULL, NULL);
-			return false;
-		}
-		/* Read-only access ends here; Evas keeps the decoded pixels. */
-		evas_object_image_data_set(sd->image, const_cast<void *>(pixels));
-	} else {
-		if (!probe)
-			probe = _probe_open(sd->obj, source);
-		if (!probe)
-			return false;
-		const void *pixels = _image_pixels_decode(probe.get());
-		int sw = 0, sh = 0;
-		evas_object_image_size_get(probe.get(), &sw, &sh);
-		if (!pixels || !_image_pixels_put(sd, pixels, sw, sh, plan.orientation,
-						  evas_object_image_alpha_get(probe.get())))
-			return false;
-	}
+	if (!probe)
+		probe = _probe_open(sd->obj, source);
+	if (!probe)
+		return false;
+	const void *pixels = _image_pixels_decode(probe.get());
+	int sw = 0, sh = 0;
+	evas_object_image_size_get(probe.get(), &sw, &sh);
+	if (!pixels || !_image_pixels_put(sd, pixels, sw, sh, plan.orientation, evas_object_image_alpha_get(probe.get())))
+		return false;
 	sd->img_w = plan.target_w;
 	sd->img_h = plan.target_h;
 	return true;
@@ -720,6 +709,26 @@ void _own_pixels_release_unshown(Mainimg_Smart_Data *sd)
 	sd->own_pixels = NULL;
 }
 
+/* The picture goes: Evas frees its own pixels or lets the file go, the
+ * main image frees its earlier buffer unless it is `keep` (coming back
+ * reworked). The field is cleared first, as Evas reports the image resized
+ * from inside these calls. */
+static void _picture_drop(Mainimg_Smart_Data *sd, const void *keep)
+{
+	Evas_Object *image = sd->image;
+	void *earlier = sd->own_pixels;
+	sd->own_pixels = NULL;
+	const char *file = NULL;
+	const Eina_File *mapped = NULL;
+	evas_object_image_file_get(image, &file, NULL);
+	evas_object_image_mmap_get(image, &mapped, NULL);
+	if (file || mapped)
+		evas_object_image_file_set(image, NULL, NULL);
+	evas_object_image_data_set(image, NULL);
+	if (earlier != keep)
+		free(earlier);
+}
+
 /* Evas shows pixels given with evas_object_image_data_set as they are and
  * never frees them; putting a picture in Evas's own buffer instead costs a
  * copy into fresh pages, page faults included. */
@@ -732,18 +741,13 @@ Eina_Bool ie_image_pixels_take(Evas_Object *obj, void *pixels, int w, int h)
 	Mainimg_Smart_Data *sd = _mainimg_data_get(obj);
 	IE_CHECK_VAL(sd, EINA_FALSE);
 
-	/* The old picture goes: Evas frees its own pixels, the main image its
-	 * earlier buffer unless it comes back reworked. The field is cleared
-	 * first, as Evas reports the image resized from inside these calls. */
+	_picture_drop(sd, pixels);
 	Evas_Object *image = sd->image;
-	void *earlier = sd->own_pixels;
-	sd->own_pixels = NULL;
-	evas_object_image_data_set(image, NULL);
-	if (earlier != pixels)
-		free(earlier);
 	evas_object_image_size_set(image, w, h);
-	/* Evas reads the rows at its own stride. */
-	if (w <= 0 || h <= 0 || evas_object_image_stride_get(image) != w * 4) {
+	/* Evas reads the rows at its own stride, which it reports cut to 16
+	 * bits: a picture 8192 or more pixels wide shows only the low half. */
+	const int stride = evas_object_image_stride_get(image);
+	if (w <= 0 || h <= 0 || (stride & 0xffff) != ((w * 4) & 0xffff)) {
 		IE_LOG_E("Cannot show a %dx%d picture", w, h);
 		return EINA_FALSE;
 	}
@@ -751,6 +755,30 @@ Eina_Bool ie_image_pixels_take(Evas_Object *obj, void *pixels, int w, int h)
 	evas_object_image_data_update_add(image, 0, 0, w, h);
 	sd->own_pixels = taken.release();
 	return EINA_TRUE;
+}
+
+void *ie_image_own_pixels_get(Evas_Object *obj, int w, int h)
+{
+	IE_CHECK_NULL(obj);
+	Mainimg_Smart_Data *sd = _mainimg_data_get(obj);
+	IE_CHECK_NULL(sd);
+	int shown_w = 0, shown_h = 0;
+	evas_object_image_size_get(sd->image, &shown_w, &shown_h);
+	if (sd->own_pixels && shown_w == w && shown_h == h &&
+	    evas_object_image_data_get(sd->image, EINA_FALSE) == sd->own_pixels)
+		return sd->own_pixels;
+	/* Every pixel is written anew: the old picture goes first, so that
+	 * two of them are never held at once. */
+	_picture_drop(sd, NULL);
+	size_t bytes = 0;
+	void *pixels = NULL;
+	if (w > 0 && h > 0 && !__builtin_mul_overflow((size_t)w * (size_t)h, (size_t)4, &bytes))
+		pixels = malloc(bytes);
+	if (!pixels) {
+		IE_LOG_E("Cannot hold a %dx%d picture", w, h);
+		return NULL;
+	}
+	return ie_image_pixels_take(obj, pixels, w, h) ? pixels : NULL;
 }
 
 Eina_Bool ie_image_pixels_owned(Evas_Object *obj, const void *pixels)

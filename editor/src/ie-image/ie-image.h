@@ -31,6 +31,12 @@ void *ie_image_data_get(Evas_Object *obj);
  * shows other pixels. `pixels` may be the main image's own buffer,
  * reworked in place. */
 Eina_Bool ie_image_pixels_take(Evas_Object *obj, void *pixels, int w, int h);
+/* A w x h buffer of the main image's own, shown as the picture, for the
+ * caller to write every pixel of and then mark with
+ * evas_object_image_data_update_add: the one the picture shows if it has
+ * that size, else a new one (not cleared) that replaces the picture. NULL
+ * when none can be had; the picture is then empty. */
+void *ie_image_own_pixels_get(Evas_Object *obj, int w, int h);
 /* Whether `pixels`, as ie_image_data_get gave them, are the buffer the
  * main image owns: a caller may then rework them in place and hand them
  * back with ie_image_pixels_take. */
