@@ -121,10 +121,17 @@ protected:
 		return ie_image_file_load(obj_, path.c_str(), box_w, box_h);
 	}
 
+	/* A background load on a busy machine may take a while: the wait ends
+	 * as soon as the pixels are in. */
 	bool wait_for_pixels()
 	{
-		return run_until([this] { return pixel_size().w > 0 && !sd()->processing_popup; });
+		return run_until([this] { return pixel_size().w > 0 && !sd()->processing_popup; }, 30.0);
 	}
+
+	/* Deletions of the loading popup, counted in the fixture so that a
+	 * test that fails while the popup lives leaves it nothing to write to
+	 * in a finished test's frame. */
+	int popups_deleted = 0;
 
 	/* JPEG and resampling blur colours a little. */
 	void expect_colour(int x, int y, uint32_t rgb, int tolerance = 28)
@@ -195,7 +202,6 @@ TEST_F(MainImageLoad, ReducesToTheBoxAtOnceOrBehindThePopup)
 		{ turned(2000, 1500, 6), 960, 1280, AT_ONCE, 0, 6 },
 		{ turned(4000, 3000, 8), 960, 1280, WORKER, 0, 8 },
 	};
-	int popups_deleted = 0;
 	for (const Case &c : cases) {
 		SCOPED_TRACE(c.path);
 		ASSERT_TRUE(load(c.path));
@@ -421,7 +427,7 @@ TEST_F(MainImageLoad, DeletingDuringABackgroundLoadLeavesNothingBehind)
 		evas_image_cache_flush(evas());
 		ASSERT_TRUE(ie_image_file_load(obj_, path.c_str(), 720, 1280));
 		ASSERT_NE(sd()->processing_popup, nullptr);
-		int popups_deleted = 0;
+		popups_deleted = 0;
 		evas_object_event_callback_add(sd()->processing_popup, EVAS_CALLBACK_DEL, count_del, &popups_deleted);
 		if (editor_first) {
 			/* The popup and the gesture layer die with the editor's
