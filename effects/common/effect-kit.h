@@ -480,48 +480,56 @@ __attribute__((target("avx2"))) inline int shrink_blocks_avx2(const float *src, 
 }
 #endif
 
-/* Mean of each factor x factor block (the last ones partial) of a picture
- * whose rows `rows(y)` hands out in order. */
+/* Row `sy` of the means of factor x factor blocks (the last ones partial)
+ * of a width x height picture whose rows `rows(y)` hands out: rows
+ * sy * factor on, in order. `row_sum` holds a shrunk row's width of
+ * scratch. */
+template <class Rows>
+void shrink_row(int width, int height, int factor, int sy, Rows &&rows, float *row_sum, float *dst, Path path)
+{
+	(void)path;
+	const int small_width = (width + factor - 1) / factor;
+	std::fill(row_sum, row_sum + small_width, 0.f);
+	const int y0 = sy * factor, y1 = std::min(y0 + factor, height);
+	for (int y = y0; y < y1; ++y) {
+		const float *src = rows(y);
+		if (factor == 2) {
+			/* The common case, without the inner loop's overhead. */
+			const int pairs = width / 2;
+			for (int sx = 0; sx < pairs; ++sx)
+				row_sum[sx] += src[2 * sx] + src[2 * sx + 1];
+			if (width % 2)
+				row_sum[pairs] += src[width - 1];
+			continue;
+		}
+		int sx = 0;
+#if KIT_X86
+		if (path == Path::AVX2)
+			sx = shrink_blocks_avx2(src, width, factor, row_sum);
+#endif
+		for (; sx < small_width; ++sx) {
+			const int x0 = sx * factor, x1 = std::min(x0 + factor, width);
+			float sum = 0.f;
+			for (int x = x0; x < x1; ++x)
+				sum += src[x];
+			row_sum[sx] += sum;
+		}
+	}
+	for (int sx = 0; sx < small_width; ++sx) {
+		const int columns = std::min(factor, width - sx * factor);
+		dst[sx] = row_sum[sx] / float(columns * (y1 - y0));
+	}
+}
+
+/* The whole shrunk picture. */
 template <class Rows>
 Plane shrink_rows(int width, int height, int factor, Rows &&rows)
 {
 	const Path path = best_path();
-	(void)path;
 	Plane small((width + factor - 1) / factor, (height + factor - 1) / factor);
-	std::vector<float> row_sum(size_t(small.width));
-	for (int sy = 0; sy < small.height; ++sy) {
-		std::fill(row_sum.begin(), row_sum.end(), 0.f);
-		const int y0 = sy * factor, y1 = std::min(y0 + factor, height);
-		for (int y = y0; y < y1; ++y) {
-			const float *src = rows(y);
-			if (factor == 2) {
-				/* The common case, without the inner loop's overhead. */
-				const int pairs = width / 2;
-				for (int sx = 0; sx < pairs; ++sx)
-					row_sum[size_t(sx)] += src[2 * sx] + src[2 * sx + 1];
-				if (width % 2)
-					row_sum[size_t(pairs)] += src[width - 1];
-				continue;
-			}
-			int sx = 0;
-#if KIT_X86
-			if (path == Path::AVX2)
-				sx = shrink_blocks_avx2(src, width, factor, row_sum.data());
-#endif
-			for (; sx < small.width; ++sx) {
-				const int x0 = sx * factor, x1 = std::min(x0 + factor, width);
-				float sum = 0.f;
-				for (int x = x0; x < x1; ++x)
-					sum += src[x];
-				row_sum[size_t(sx)] += sum;
-			}
-		}
-		float *dst = small.row(sy);
-		for (int sx = 0; sx < small.width; ++sx) {
-			const int columns = std::min(factor, width - sx * factor);
-			dst[sx] = row_sum[size_t(sx)] / float(columns * (y1 - y0));
-		}
-	}
+	Floats row_sum(size_t(small.width));
+	for (int sy = 0; sy < small.height; ++sy)
+		shrink_row(width, height, factor, sy, rows, row_sum.data(), small.row(sy), path);
 	return small;
 }
 
@@ -530,27 +538,88 @@ inline Plane shrink(const Plane &p, int factor)
 	return shrink_rows(p.width, p.height, factor, [&](int y) { return p.row(y); });
 }
 
+/* Rows of a generator that makes them once each, in order (`make(y, row)`
+ * fills row y), kept from the oldest row a reader may still ask for to the
+ * newest made: readers ahead make rows as they ask, and the slowest one
+ * lets the old rows go with keep_from. The store starts with room for
+ * `rows` rows (all of them, where a reader must see the whole picture
+ * before the first rows are used) and doubles when the readers are further
+ * apart. A row's pointer holds until rows are next made. */
+class RowWindow {
+public:
+	using Make = std::function<void(int, float *)>;
+
+	RowWindow(int row_length, int rows, Make make)
+		: length_(size_t(row_length)), capacity_(std::max(rows, 1)), make_(std::move(make)),
+		  store_(size_t(capacity_) * length_)
+	{
+	}
+
+	/* Row y, not below the last keep_from. */
+	const float *row(int y)
+	{
+		while (made_ < y) {
+			if (made_ + 1 - kept_from_ >= capacity_)
+				grow();
+			++made_;
+			make_(made_, slot(made_));
+		}
+		return slot(y);
+	}
+
+	/* No row below y is asked for again. */
+	void keep_from(int y) { kept_from_ = std::max(kept_from_, y); }
+
+private:
+	float *slot(int y) { return store_.data() + size_t(y % capacity_) * length_; }
+
+	void grow()
+	{
+		const int capacity = 2 * capacity_;
+		Floats store(size_t(capacity) * length_);
+		for (int y = kept_from_; y <= made_; ++y)
+			std::copy(slot(y), slot(y) + length_, store.data() + size_t(y % capacity) * length_);
+		store_.swap(store);
+		capacity_ = capacity;
+	}
+
+	size_t length_;
+	int capacity_, made_ = -1, kept_from_ = 0;
+	Make make_;
+	Floats store_;
+};
+
 /* Bilinear enlargement of a shrunk plane, a row at a time: each output row
  * mixes two rows of the small plane interpolated across, which are worked
- * out once and kept while the output rows between them are made. */
+ * out once and kept while the output rows between them are made. Output
+ * rows asked for in order ask for each small row once, in order, so a
+ * generator may make those as they are needed. */
 class Expander {
 public:
+	using SmallRows = std::function<const float *(int)>;
+
 	Expander(const Plane &small, int factor, int width, int height)
-		: small_(small), height_(height), inverse_(1.f / float(factor)), x0_(size_t(width)), x1_(size_t(width)),
-		  fx_(size_t(width)), across_{Floats(size_t(width)), Floats(size_t(width))}
+		: Expander(small.width, small.height, [&small](int y) { return small.row(y); }, factor, width, height)
+	{
+	}
+
+	Expander(int small_width, int small_height, SmallRows small_rows, int factor, int width, int height)
+		: small_rows_(std::move(small_rows)), small_width_(small_width), small_height_(small_height), height_(height),
+		  inverse_(1.f / float(factor)), x0_(size_t(width)), x1_(size_t(width)), fx_(size_t(width)),
+		  across_{Floats(size_t(width)), Floats(size_t(width))}
 	{
 		for (int x = 0; x < width; ++x) {
-			float sx = std::clamp((float(x) + 0.5f) * inverse_ - 0.5f, 0.f, float(small.width - 1));
+			float sx = std::clamp((float(x) + 0.5f) * inverse_ - 0.5f, 0.f, float(small_width - 1));
 			x0_[size_t(x)] = int(sx);
-			x1_[size_t(x)] = std::min(int(sx) + 1, small.width - 1);
+			x1_[size_t(x)] = std::min(int(sx) + 1, small_width - 1);
 			fx_[size_t(x)] = sx - float(int(sx));
 		}
 	}
 
 	void row(int y, float *dst)
 	{
-		float sy = std::clamp((float(y) + 0.5f) * inverse_ - 0.5f, 0.f, float(small_.height - 1));
-		int y0 = int(sy), y1 = std::min(y0 + 1, small_.height - 1);
+		float sy = std::clamp((float(y) + 0.5f) * inverse_ - 0.5f, 0.f, float(small_height_ - 1));
+		int y0 = int(sy), y1 = std::min(y0 + 1, small_height_ - 1);
 		float fy = sy - float(y0);
 		const float *t = across(y0, y1), *u = across(y1, y0);
 		const size_t width = fx_.size();
@@ -569,7 +638,7 @@ private:
 				return across_[i].data();
 		const int slot = held_[0] == other ? 1 : 0;
 		held_[slot] = wanted;
-		const float *src = small_.row(wanted);
+		const float *src = small_rows_(wanted);
 		float *dst = across_[slot].data();
 		size_t x = 0;
 #if KIT_X86
@@ -597,7 +666,7 @@ private:
 			const __m256i right = _mm256_loadu_si256(reinterpret_cast<const __m256i *>(&x1_[x]));
 			const int first = x0_[x];
 			__m256 a, b;
-			if (x1_[x + 7] - first < 8 && first + 8 <= small_.width) {
+			if (x1_[x + 7] - first < 8 && first + 8 <= small_width_) {
 				const __m256 window = _mm256_loadu_ps(src + first);
 				const __m256i start = _mm256_set1_epi32(first);
 				a = _mm256_permutevar8x32_ps(window, _mm256_sub_epi32(left, start));
@@ -612,8 +681,8 @@ private:
 	}
 #endif
 
-	const Plane &small_;
-	int height_;
+	SmallRows small_rows_;
+	int small_width_, small_height_, height_;
 	Path path_ = best_path();
 	float inverse_;
 	std::vector<int> x0_, x1_;
@@ -653,7 +722,7 @@ public:
 			expander_ = std::make_unique<Expander>(small_, factor, width, height);
 			return;
 		}
-		if (sigma > 0.f && sigma < 2.5f) {
+		if (narrow(sigma)) {
 			taps_ = gaussian_taps(sigma);
 			radius_ = int(taps_.size() / 2);
 			sources_.resize(taps_.size());
@@ -671,6 +740,10 @@ public:
 		}
 		gaussian_blur_full(whole_, sigma);
 	}
+
+	/* A narrow blur asks for the rows only as its own rows are asked for,
+	 * a few ahead; any other reads every row when it is made. */
+	static bool narrow(float sigma) { return sigma > 0.f && sigma < 2.5f; }
 
 	void row(int y, float *dst)
 	{

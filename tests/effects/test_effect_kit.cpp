@@ -73,4 +73,60 @@ TEST(EffectKit, ExpandedRowsMatchThePlainBilinearFormula)
 	}
 }
 
+/* The streamed stages of an effect read one generator from two places at
+ * once, far apart: every row must reach each reader as it was made, made
+ * once, and rows a reader still needs must survive the store growing. */
+TEST(EffectKit, RowWindowKeepsWhatItsReadersStillNeed)
+{
+	const int width = 5, height = 300;
+	auto value = [](int y, int x) { return float(y * 1000 + x); };
+	for (int first_room : {1, 8, height}) {
+		for (int lead : {0, 3, 40, height}) {
+			std::vector<int> made;
+			kit::RowWindow window(width, first_room, [&](int y, float *row) {
+				made.push_back(y);
+				for (int x = 0; x < width; ++x)
+					row[x] = value(y, x);
+			});
+			for (int y = 0; y < height; ++y) {
+				window.keep_from(y);
+				const float *ahead = window.row(std::min(y + lead, height - 1));
+				ASSERT_EQ(ahead[width - 1], value(std::min(y + lead, height - 1), width - 1));
+				const float *row = window.row(y);
+				for (int x = 0; x < width; ++x)
+					ASSERT_EQ(row[x], value(y, x)) << "room " << first_room << " lead " << lead << " row " << y;
+			}
+			ASSERT_EQ(made.size(), size_t(height));
+			for (int y = 0; y < height; ++y)
+				ASSERT_EQ(made[size_t(y)], y);
+		}
+	}
+}
+
+/* Output rows asked for in order ask for each small row once, in order:
+ * what lets a generator make the small rows as they are needed. */
+TEST(EffectKit, ExpanderAsksForEachSmallRowOnceInOrder)
+{
+	for (int factor : {1, 2, 3}) {
+		for (auto [w, h] : std::initializer_list<std::pair<int, int>>{{1, 1}, {7, 1}, {9, 14}, {20, 31}}) {
+			const kit::Plane small = random_plane((w + factor - 1) / factor, (h + factor - 1) / factor, uint32_t(w + h));
+			kit::Plane want(w, h);
+			kit::expand_into(small, factor, want);
+			std::vector<int> asked;
+			kit::Expander rows(small.width, small.height, [&](int y) {
+				asked.push_back(y);
+				return small.row(y);
+			}, factor, w, h);
+			kit::Plane got(w, h, -1.f);
+			for (int y = 0; y < h; ++y)
+				rows.row(y, got.row(y));
+			EXPECT_TRUE(got.v == want.v) << "factor " << factor << " " << w << "x" << h;
+			std::vector<int> in_order(size_t(small.height));
+			for (int y = 0; y < small.height; ++y)
+				in_order[size_t(y)] = y;
+			EXPECT_EQ(asked, in_order) << "factor " << factor << " " << w << "x" << h;
+		}
+	}
+}
+
 } // namespace
