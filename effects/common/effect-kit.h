@@ -478,6 +478,23 @@ __attribute__((target("avx2"))) inline int shrink_blocks_avx2(const float *src, 
 	}
 	return sx;
 }
+
+/* The factor-2 case: eight pairs a step, each summed left to right and
+ * added to its running sum; returns the first pair left for the plain
+ * loop. */
+__attribute__((target("avx2"))) inline int shrink_pairs_avx2(const float *src, int pairs, float *row_sum)
+{
+	int sx = 0;
+	for (; sx + 8 <= pairs; sx += 8) {
+		const __m256 low = _mm256_loadu_ps(src + 2 * sx), high = _mm256_loadu_ps(src + 2 * sx + 8);
+		/* The pairs are summed within each half; the halves then put
+		 * them in order. */
+		const __m256 sums =
+			_mm256_castpd_ps(_mm256_permute4x64_pd(_mm256_castps_pd(_mm256_hadd_ps(low, high)), 0xD8));
+		_mm256_storeu_ps(row_sum + sx, _mm256_add_ps(_mm256_loadu_ps(row_sum + sx), sums));
+	}
+	return sx;
+}
 #endif
 
 /* Row `sy` of the means of factor x factor blocks (the last ones partial)
@@ -496,7 +513,12 @@ void shrink_row(int width, int height, int factor, int sy, Rows &&rows, float *r
 		if (factor == 2) {
 			/* The common case, without the inner loop's overhead. */
 			const int pairs = width / 2;
-			for (int sx = 0; sx < pairs; ++sx)
+			int sx = 0;
+#if KIT_X86
+			if (path == Path::AVX2)
+				sx = shrink_pairs_avx2(src, pairs, row_sum);
+#endif
+			for (; sx < pairs; ++sx)
 				row_sum[sx] += src[2 * sx] + src[2 * sx + 1];
 			if (width % 2)
 				row_sum[pairs] += src[width - 1];

@@ -73,6 +73,43 @@ TEST(EffectKit, ExpandedRowsMatchThePlainBilinearFormula)
 	}
 }
 
+/* Block means on both paths, each block summed left to right and the rows'
+ * sums added top to bottom; widths around the vector steps (8 pairs, 8
+ * blocks) and partial last blocks. */
+TEST(EffectKit, ShrunkRowsMatchThePlainBlockMeansOnBothPaths)
+{
+	std::vector<kit::Path> paths{kit::Path::REFERENCE};
+	if (__builtin_cpu_supports("avx2"))
+		paths.push_back(kit::Path::AVX2);
+	for (int factor : {2, 3, 5}) {
+		for (auto [w, h] : std::initializer_list<std::pair<int, int>>{{1, 1}, {1, 5}, {15, 2}, {16, 3}, {17, 4}, {33, 7}, {81, 5}}) {
+			const kit::Plane src = random_plane(w, h, uint32_t(factor * 13 + w * 3 + h));
+			const int small_width = (w + factor - 1) / factor, small_height = (h + factor - 1) / factor;
+			std::vector<float> want(size_t(small_width) * size_t(small_height));
+			for (int sy = 0; sy < small_height; ++sy)
+				for (int sx = 0; sx < small_width; ++sx) {
+					const int y1 = std::min((sy + 1) * factor, h), x1 = std::min((sx + 1) * factor, w);
+					float total = 0.f;
+					for (int y = sy * factor; y < y1; ++y) {
+						float sum = 0.f;
+						for (int x = sx * factor; x < x1; ++x)
+							sum += src.row(y)[x];
+						total += sum;
+					}
+					want[size_t(sy * small_width + sx)] = total / float((x1 - sx * factor) * (y1 - sy * factor));
+				}
+			for (kit::Path path : paths) {
+				std::vector<float> got(want.size(), -1.f);
+				std::vector<float> scratch(static_cast<size_t>(small_width));
+				for (int sy = 0; sy < small_height; ++sy)
+					kit::shrink_row(w, h, factor, sy, [&](int y) { return src.row(y); }, scratch.data(),
+							&got[size_t(sy * small_width)], path);
+				EXPECT_TRUE(got == want) << "factor " << factor << " " << w << "x" << h << " path " << int(path);
+			}
+		}
+	}
+}
+
 /* The streamed stages of an effect read one generator from two places at
  * once, far apart: every row must reach each reader as it was made, made
  * once, and rows a reader still needs must survive the store growing. */
