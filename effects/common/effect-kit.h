@@ -301,6 +301,38 @@ inline Plane luma_plane(const Rgb &rgb)
 	return y;
 }
 
+#if KIT_X86
+/* Eight pixels a step, each read as the four bytes from its first; it stops
+ * while a pixel follows, so the byte past the eighth is still the row's. */
+__attribute__((target("avx2"))) inline int luma_row_avx2(const uint8_t *px, int width, float *dst)
+{
+	const __m256i offsets = _mm256_setr_epi32(0, 3, 6, 9, 12, 15, 18, 21), byte = _mm256_set1_epi32(0xFF);
+	int x = 0;
+	for (; x + 8 < width; x += 8) {
+		const __m256i v = _mm256_i32gather_epi32(reinterpret_cast<const int *>(px + 3 * x), offsets, 1);
+		const __m256 r = _mm256_cvtepi32_ps(_mm256_and_si256(v, byte));
+		const __m256 g = _mm256_cvtepi32_ps(_mm256_and_si256(_mm256_srli_epi32(v, 8), byte));
+		const __m256 b = _mm256_cvtepi32_ps(_mm256_and_si256(_mm256_srli_epi32(v, 16), byte));
+		const __m256 rg = _mm256_add_ps(_mm256_mul_ps(_mm256_set1_ps(0.299f), r), _mm256_mul_ps(_mm256_set1_ps(0.587f), g));
+		_mm256_storeu_ps(dst + x, _mm256_add_ps(rg, _mm256_mul_ps(_mm256_set1_ps(0.114f), b)));
+	}
+	return x;
+}
+#endif
+
+/* The luma of a row of RGB pixels, as luma_plane weighs it. */
+inline void luma_row(const uint8_t *px, int width, float *dst, Path path)
+{
+	(void)path;
+	int x = 0;
+#if KIT_X86
+	if (path == Path::AVX2)
+		x = luma_row_avx2(px, width, dst);
+#endif
+	for (; x < width; ++x)
+		dst[x] = 0.299f * px[3 * x] + 0.587f * px[3 * x + 1] + 0.114f * px[3 * x + 2];
+}
+
 /* Writes the planes back, clamped and rounded; a fourth byte, when the
  * layout has one, is set opaque. */
 inline void write_rgb(const Rgb &rgb, uint8_t *px, int step, int ri, int gi, int bi)
