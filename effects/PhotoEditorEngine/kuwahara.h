@@ -51,14 +51,8 @@ public:
 		/* Slide both windows down a row: the new bottom row enters the
 		 * ring where the row no longer needed was. */
 		row_sums(y + 2 * radius_ + 1);
-		const Packed *upper_in = ring_row(y + radius_ + 1), *upper_out = ring_row(y);
-		const Packed *lower_in = ring_row(y + 2 * radius_ + 1), *lower_out = ring_row(y + radius_);
-		for (int i = 0; i < windows_; ++i) {
-			upper_[size_t(i)].colour += upper_in[i].colour - upper_out[i].colour;
-			upper_[size_t(i)].luma += upper_in[i].luma - upper_out[i].luma;
-			lower_[size_t(i)].colour += lower_in[i].colour - lower_out[i].colour;
-			lower_[size_t(i)].luma += lower_in[i].luma - lower_out[i].luma;
-		}
+		slide(upper_.data(), ring_row(y + radius_ + 1), ring_row(y));
+		slide(lower_.data(), ring_row(y + 2 * radius_ + 1), ring_row(y + radius_));
 	}
 
 private:
@@ -74,6 +68,21 @@ private:
 		uint64_t colour, luma;
 	};
 
+	/* A window's sums moved down a row: the row entering added, the one
+	 * leaving taken away. */
+	void slide(Packed *sums, const Packed *entering, const Packed *leaving) const
+	{
+		int i = 0;
+#if KIT_X86
+		if (path_ == kit::Path::AVX2)
+			i = slide_avx2(sums, entering, leaving, windows_);
+#endif
+		for (; i < windows_; ++i) {
+			sums[i].colour += entering[i].colour - leaving[i].colour;
+			sums[i].luma += entering[i].luma - leaving[i].luma;
+		}
+	}
+
 	/* Row sums of padded row `padded_y` (the picture padded by `radius` on
 	 * every side with its border repeated): windows of `size` starting at
 	 * each padded column, into the ring. */
@@ -81,8 +90,14 @@ private:
 	{
 		const uint8_t *src = rgb_ + size_t(std::clamp(padded_y - radius_, 0, height_ - 1)) * size_t(width_) * 3;
 		Packed *line = line_.data();
-		for (int x = 0; x < width_; ++x, src += 3) {
-			uint64_t r = src[0], g = src[1], b = src[2];
+		int x = 0;
+#if KIT_X86
+		if (path_ == kit::Path::AVX2)
+			x = pack_avx2(src, width_, line + radius_);
+#endif
+		for (; x < width_; ++x) {
+			const uint8_t *px = src + size_t(x) * 3;
+			uint64_t r = px[0], g = px[1], b = px[2];
 			uint64_t l = uint64_t(kit::luma(int(r), int(g), int(b)));
 			line[radius_ + x] = {r | g << COLOUR_LANE | b << (2 * COLOUR_LANE), l | (l * l) << 32};
 		}
@@ -129,6 +144,51 @@ private:
 	}
 
 #if KIT_X86
+	/* Two windows a step; returns the first left. */
+	__attribute__((target("avx2"))) static int slide_avx2(Packed *sums, const Packed *entering, const Packed *leaving,
+							      int count)
+	{
+		int i = 0;
+		for (; i + 2 <= count; i += 2) {
+			__m256i *sum = reinterpret_cast<__m256i *>(sums + i);
+			const __m256i in = _mm256_loadu_si256(reinterpret_cast<const __m256i *>(entering + i));
+			const __m256i out = _mm256_loadu_si256(reinterpret_cast<const __m256i *>(leaving + i));
+			_mm256_storeu_si256(sum, _mm256_add_epi64(_mm256_loadu_si256(sum), _mm256_sub_epi64(in, out)));
+		}
+		return i;
+	}
+
+	/* Pixels packed as row_sums packs them, four a step in 64-bit lanes;
+	 * a step reads sixteen bytes for its twelve. Returns the first pixel
+	 * left. */
+	__attribute__((target("avx2"))) static int pack_avx2(const uint8_t *src, int width, Packed *dst)
+	{
+		const __m128i reds = _mm_setr_epi8(0, 3, 6, 9, -1, -1, -1, -1, -1, -1, -1, -1, -1, -1, -1, -1);
+		const __m128i greens = _mm_setr_epi8(1, 4, 7, 10, -1, -1, -1, -1, -1, -1, -1, -1, -1, -1, -1, -1);
+		const __m128i blues = _mm_setr_epi8(2, 5, 8, 11, -1, -1, -1, -1, -1, -1, -1, -1, -1, -1, -1, -1);
+		const __m256i red_weight = _mm256_set1_epi64x(77), green_weight = _mm256_set1_epi64x(150);
+		const __m256i blue_weight = _mm256_set1_epi64x(29);
+		int x = 0;
+		for (; 3 * x + 16 <= 3 * width; x += 4) {
+			const __m128i bytes = _mm_loadu_si128(reinterpret_cast<const __m128i *>(src + size_t(x) * 3));
+			const __m256i r = _mm256_cvtepu8_epi64(_mm_shuffle_epi8(bytes, reds));
+			const __m256i g = _mm256_cvtepu8_epi64(_mm_shuffle_epi8(bytes, greens));
+			const __m256i b = _mm256_cvtepu8_epi64(_mm_shuffle_epi8(bytes, blues));
+			const __m256i l = _mm256_srli_epi64(
+				_mm256_add_epi64(_mm256_add_epi64(_mm256_mul_epu32(r, red_weight), _mm256_mul_epu32(g, green_weight)),
+						 _mm256_mul_epu32(b, blue_weight)),
+				8);
+			const __m256i colour = _mm256_or_si256(
+				r, _mm256_or_si256(_mm256_slli_epi64(g, COLOUR_LANE), _mm256_slli_epi64(b, 2 * COLOUR_LANE)));
+			const __m256i luma = _mm256_or_si256(l, _mm256_slli_epi64(_mm256_mul_epu32(l, l), 32));
+			/* (colour, luma) of pixels 0 and 2, and of 1 and 3; then in order. */
+			const __m256i even = _mm256_unpacklo_epi64(colour, luma), odd = _mm256_unpackhi_epi64(colour, luma);
+			_mm256_storeu_si256(reinterpret_cast<__m256i *>(dst + x), _mm256_permute2x128_si256(even, odd, 0x20));
+			_mm256_storeu_si256(reinterpret_cast<__m256i *>(dst + x + 2), _mm256_permute2x128_si256(even, odd, 0x31));
+		}
+		return x;
+	}
+
 	/* Four sums in 64-bit lanes (each below 2^21) as means. */
 	__attribute__((target("avx2"))) static void store_means(__m256i lanes, __m256i lows, __m256 inverse, float *dst)
 	{

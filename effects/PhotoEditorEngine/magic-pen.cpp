@@ -19,12 +19,10 @@ inline int magic_pen_body(const uint8_t *in, uint8_t *out, int width, int height
 		 * line row is found from three smoothed rows. */
 		kit::Plane lines(width, height);
 		{
-			kit::Floats luma_row(static_cast<size_t>(width));
+			kit::Floats luma(static_cast<size_t>(width));
 			kit::BlurredRows smoothed(width, height, std::max(0.7f, extent / 900.f), [&](int y) {
-				const uint8_t *px = in + size_t(y) * size_t(width) * 3;
-				for (int x = 0; x < width; ++x, px += 3)
-					luma_row[size_t(x)] = 0.299f * px[0] + 0.587f * px[1] + 0.114f * px[2];
-				return luma_row.data();
+				kit::luma_row(in + size_t(y) * size_t(width) * 3, width, luma.data(), path);
+				return luma.data();
 			});
 			kit::Floats ring(size_t(width) * 3);
 			auto smoothed_at = [&](int y) { return &ring[size_t(y % 3) * size_t(width)]; };

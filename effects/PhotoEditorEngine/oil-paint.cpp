@@ -9,13 +9,11 @@ constexpr float INVERSE_TAPS = 1.f / float(2 * TAPS + 1);
 constexpr uint32_t NOISE_SALT = 0x011;
 
 /* The streak at (x, y): the noise averaged along the stroke, which runs
- * across the gradient of the flow (diagonally where it is flat). */
-inline float streak_at(const kit::Plane &flow, const uint8_t *noise, float step, int x, int y)
+ * across the gradient of the flow (diagonally where it is flat); `up`,
+ * `mid` and `down` are the flow's rows around y. */
+inline float streak_at(const float *up, const float *mid, const float *down, int width, int height,
+		       const uint8_t *noise, float step, int x, int y)
 {
-	const int width = flow.width, height = flow.height;
-	const float *up = flow.row(std::max(y - 1, 0));
-	const float *mid = flow.row(y);
-	const float *down = flow.row(std::min(y + 1, height - 1));
 	float gx = mid[std::min(x + 1, width - 1)] - mid[std::max(x - 1, 0)];
 	float gy = down[x] - up[x];
 	float len = std::sqrt(gx * gx + gy * gy);
@@ -35,14 +33,11 @@ inline float streak_at(const kit::Plane &flow, const uint8_t *noise, float step,
 #if KIT_X86
 #pragma GCC push_options
 #pragma GCC target("avx2")
-/* Rows y0..y1-1 of the streaks from x = 1 on, eight pixels a step with
- * the noise taps as gathers; returns where the reference takes over. */
-int streak_row_avx2(const kit::Plane &flow, const uint8_t *noise, float step, int y, float *dst)
+/* Row y of the streaks from x = 1 on, eight pixels a step with the noise
+ * taps as gathers; returns where the reference takes over. */
+int streak_row_avx2(const float *up, const float *mid, const float *down, int width, int height, const uint8_t *noise,
+		    float step, int y, float *dst)
 {
-	const int width = flow.width, height = flow.height;
-	const float *up = flow.row(std::max(y - 1, 0));
-	const float *mid = flow.row(y);
-	const float *down = flow.row(std::min(y + 1, height - 1));
 	const __m256 half = _mm256_set1_ps(0.5f), one = _mm256_set1_ps(1.f), tiny = _mm256_set1_ps(1e-3f);
 	const __m256 diagonal = _mm256_set1_ps(0.7071f), steps = _mm256_set1_ps(step);
 	const __m256 sign = _mm256_set1_ps(-0.f), inverse_taps = _mm256_set1_ps(INVERSE_TAPS);
@@ -104,69 +99,107 @@ void noise_row_avx2(int width, uint32_t y, uint8_t *dst)
 #pragma GCC pop_options
 #endif
 
-/* Bristle streaks: position-hashed noise averaged along the strokes. */
-kit::Plane bristle_streaks(const kit::Plane &flow, float step, kit::Path path)
-{
-	const int width = flow.width, height = flow.height;
-	/* Three spare bytes: a gather reads four from the last one. */
-	std::vector<uint8_t> noise(size_t(width) * size_t(height) + 3);
-	for (int y = 0; y < height; ++y) {
-		uint8_t *row = &noise[size_t(y) * size_t(width)];
+/* Bristle streaks, a row of the flow's grid at a time, in order:
+ * position-hashed noise averaged along the strokes. The flow's rows are
+ * blurred as they are needed and kept three at a time. */
+class StreakRows {
+public:
+	StreakRows(kit::BlurredRows &flow, int width, int height, float step, kit::Path path)
+		: flow_(flow), width_(width), height_(height), step_(step), path_(path),
+		  /* Three spare bytes: a gather reads four from the last one. */
+		  noise_(size_t(width) * size_t(height) + 3), flow_rows_(size_t(width) * 3), streaks_(size_t(width))
+	{
+		for (int y = 0; y < height; ++y) {
+			uint8_t *row = &noise_[size_t(y) * size_t(width)];
 #if KIT_X86
-		if (path == kit::Path::AVX2) {
-			noise_row_avx2(width, uint32_t(y), row);
-			continue;
-		}
+			if (path == kit::Path::AVX2) {
+				noise_row_avx2(width, uint32_t(y), row);
+				continue;
+			}
 #endif
-		for (int x = 0; x < width; ++x)
-			row[x] = uint8_t(kit::hash2(uint32_t(x), uint32_t(y), NOISE_SALT) >> 24);
+			for (int x = 0; x < width; ++x)
+				row[x] = uint8_t(kit::hash2(uint32_t(x), uint32_t(y), NOISE_SALT) >> 24);
+		}
 	}
-	kit::Plane streaks(width, height);
-	for (int y = 0; y < height; ++y) {
-		float *dst = streaks.row(y);
+
+	const float *row(int y)
+	{
+		while (blurred_to_ < std::min(y + 1, height_ - 1)) {
+			++blurred_to_;
+			flow_.row(blurred_to_, flow_row(blurred_to_));
+		}
+		const float *up = flow_row(std::max(y - 1, 0)), *mid = flow_row(y), *down = flow_row(std::min(y + 1, height_ - 1));
+		const uint8_t *noise = noise_.data();
+		float *dst = streaks_.data();
 		int x = 0;
 #if KIT_X86
-		if (path == kit::Path::AVX2 && width > 1) {
-			dst[0] = streak_at(flow, noise.data(), step, 0, y);
-			x = streak_row_avx2(flow, noise.data(), step, y, dst);
+		if (path_ == kit::Path::AVX2 && width_ > 1) {
+			dst[0] = streak_at(up, mid, down, width_, height_, noise, step_, 0, y);
+			x = streak_row_avx2(up, mid, down, width_, height_, noise, step_, y, dst);
 		}
 #endif
-		for (; x < width; ++x)
-			dst[x] = streak_at(flow, noise.data(), step, x, y);
+		for (; x < width_; ++x)
+			dst[x] = streak_at(up, mid, down, width_, height_, noise, step_, x, y);
+		return dst;
 	}
-	return streaks;
-}
+
+private:
+	float *flow_row(int y) { return &flow_rows_[size_t(y % 3) * size_t(width_)]; }
+
+	kit::BlurredRows &flow_;
+	int width_, height_;
+	float step_;
+	kit::Path path_;
+	int blurred_to_ = -1;
+	std::vector<uint8_t> noise_;
+	kit::Floats flow_rows_, streaks_;
+};
 
 } // namespace
 
 /* Oil paint: thick brush strokes. A wide Kuwahara filter turns the
  * picture into dabs of flat colour; bristle streaks follow the strokes,
  * and the streaks and the dabs' borders are lit from the top left as if
- * the paint stood up from the canvas. */
+ * the paint stood up from the canvas. Each stage hands its rows on as the
+ * next one asks for them, so that no plane of the picture's size is made
+ * unless a wide blur must read the whole picture first. */
 namespace {
 
 inline int oil_paint_body(const uint8_t *in, uint8_t *out, int width, int height)
 {
 	return kit::guarded([&] {
+		const kit::Path path = kit::best_path();
 		const float extent = float(std::max(width, height));
-		kit::Rgb paint = kuwahara(in, width, height, std::max(2, int(extent / 160.f)));
+		/* Streaks are drawn on a half-size grid on large pictures: they
+		 * are several pixels long there anyway. */
+		const int grid = extent >= 640.f ? 2 : 1;
+		const float flow_sigma = std::max(1.f, extent / 300.f / float(grid));
+		const float relief_sigma = std::max(0.6f, extent / 1600.f);
+
+		/* The dabs, red, green and blue rows side by side, kept from the
+		 * row being drawn to the furthest one the blurs below have read. */
+		KuwaharaRows dabs(in, width, height, std::max(2, int(extent / 160.f)), path);
+		const bool streamed = kit::BlurredRows::narrow(flow_sigma) && kit::BlurredRows::narrow(relief_sigma);
+		kit::RowWindow paint(3 * width, streamed ? 32 : height,
+				     [&](int, float *row) { dabs.next(row, row + width, row + 2 * width); });
 
 		/* The relief is the paint's luma, made a row at a time. */
 		kit::Floats relief_row(static_cast<size_t>(width));
 		auto relief = [&](int y) {
-			const float *r = paint.r.row(y), *g = paint.g.row(y), *b = paint.b.row(y);
+			const float *r = paint.row(y), *g = r + width, *b = g + width;
 			for (int x = 0; x < width; ++x)
 				relief_row[size_t(x)] = 0.299f * r[x] + 0.587f * g[x] + 0.114f * b[x];
 			return relief_row.data();
 		};
-		/* Streaks are drawn on a half-size grid on large pictures: they
-		 * are several pixels long there anyway. */
-		const int grid = extent >= 640.f ? 2 : 1;
-		kit::Plane flow = kit::shrink_rows(width, height, grid, relief);
-		kit::gaussian_blur(flow, std::max(1.f, extent / 300.f / float(grid)));
-		const kit::Plane streaks = bristle_streaks(flow, std::max(1.f, extent / 420.f / float(grid)), kit::best_path());
-		kit::Expander streak_rows(streaks, grid, width, height);
-		kit::BlurredRows relief_rows(width, height, std::max(0.6f, extent / 1600.f), relief);
+		const int flow_width = (width + grid - 1) / grid, flow_height = (height + grid - 1) / grid;
+		kit::Floats row_sum(static_cast<size_t>(flow_width)), shrunk(static_cast<size_t>(flow_width));
+		kit::BlurredRows flow(flow_width, flow_height, flow_sigma, [&](int y) {
+			kit::shrink_row(width, height, grid, y, relief, row_sum.data(), shrunk.data(), path);
+			return shrunk.data();
+		});
+		StreakRows streaks(flow, flow_width, flow_height, std::max(1.f, extent / 420.f / float(grid)), path);
+		kit::Expander streak_rows(flow_width, flow_height, [&](int y) { return streaks.row(y); }, grid, width, height);
+		kit::BlurredRows relief_rows(width, height, relief_sigma, relief);
 
 		/* Bristle marks are finer than a pixel of a thumbnail: there they
 		 * would only add noise, so they fade with the picture's size. */
@@ -176,8 +209,10 @@ inline int oil_paint_body(const uint8_t *in, uint8_t *out, int width, int height
 		kit::Floats rings(size_t(width) * 6);
 		auto relief_at = [&](int y) { return &rings[size_t(y % 3) * size_t(width)]; };
 		auto streaks_at = [&](int y) { return &rings[size_t(3 + y % 3) * size_t(width)]; };
+		kit::Floats shades(static_cast<size_t>(width)), lit(size_t(width) * 3);
 		int made = -1;
 		for (int y = 0; y < height; ++y) {
+			paint.keep_from(y);
 			const int above = std::max(y - 1, 0), below = std::min(y + 1, height - 1);
 			while (made < below) {
 				++made;
@@ -186,23 +221,28 @@ inline int oil_paint_body(const uint8_t *in, uint8_t *out, int width, int height
 			}
 			const float *relief_above = relief_at(above), *relief_below = relief_at(below);
 			const float *streaks_above = streaks_at(above), *streaks_below = streaks_at(below);
-			const float *r = paint.r.row(y), *g = paint.g.row(y), *b = paint.b.row(y);
-			uint8_t *o = out + size_t(y) * size_t(width) * 3;
-			auto shade_at = [&](int x, int left, int right) {
+			auto shade = [&](int left, int right) {
 				float edge_light = relief_above[left] - relief_below[right];
 				float bristle = streaks_above[left] - streaks_below[right];
-				float shade = edge_light * 0.8f + bristle * bristle_depth * float(grid);
-				o[size_t(x) * 3] = kit::clamp_byte(r[x] + shade);
-				o[size_t(x) * 3 + 1] = kit::clamp_byte(g[x] + shade);
-				o[size_t(x) * 3 + 2] = kit::clamp_byte(b[x] + shade);
+				return edge_light * 0.8f + bristle * bristle_depth * float(grid);
 			};
 			/* The edge columns apart, so that the inner ones read in
 			 * order. */
-			shade_at(0, 0, std::min(1, width - 1));
+			float *shade_row = shades.data();
+			shade_row[0] = shade(0, std::min(1, width - 1));
 			for (int x = 1; x < width - 1; ++x)
-				shade_at(x, x - 1, x + 1);
+				shade_row[x] = shade(x - 1, x + 1);
 			if (width > 1)
-				shade_at(width - 1, width - 2, width - 1);
+				shade_row[width - 1] = shade(width - 2, width - 1);
+			/* Taken after the rows below were made, which may move it. */
+			const float *r = paint.row(y), *g = r + width, *b = g + width;
+			float *lit_r = lit.data(), *lit_g = lit_r + width, *lit_b = lit_g + width;
+			for (int x = 0; x < width; ++x) {
+				lit_r[x] = r[x] + shade_row[x];
+				lit_g[x] = g[x] + shade_row[x];
+				lit_b[x] = b[x] + shade_row[x];
+			}
+			kit::write_row(lit_r, lit_g, lit_b, out + size_t(y) * size_t(width) * 3, width, 3, path);
 		}
 		return int(kit::RESULT_OK);
 	});

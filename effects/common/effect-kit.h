@@ -301,6 +301,38 @@ inline Plane luma_plane(const Rgb &rgb)
 	return y;
 }
 
+#if KIT_X86
+/* Eight pixels a step, each read as the four bytes from its first; it stops
+ * while a pixel follows, so the byte past the eighth is still the row's. */
+__attribute__((target("avx2"))) inline int luma_row_avx2(const uint8_t *px, int width, float *dst)
+{
+	const __m256i offsets = _mm256_setr_epi32(0, 3, 6, 9, 12, 15, 18, 21), byte = _mm256_set1_epi32(0xFF);
+	int x = 0;
+	for (; x + 8 < width; x += 8) {
+		const __m256i v = _mm256_i32gather_epi32(reinterpret_cast<const int *>(px + 3 * x), offsets, 1);
+		const __m256 r = _mm256_cvtepi32_ps(_mm256_and_si256(v, byte));
+		const __m256 g = _mm256_cvtepi32_ps(_mm256_and_si256(_mm256_srli_epi32(v, 8), byte));
+		const __m256 b = _mm256_cvtepi32_ps(_mm256_and_si256(_mm256_srli_epi32(v, 16), byte));
+		const __m256 rg = _mm256_add_ps(_mm256_mul_ps(_mm256_set1_ps(0.299f), r), _mm256_mul_ps(_mm256_set1_ps(0.587f), g));
+		_mm256_storeu_ps(dst + x, _mm256_add_ps(rg, _mm256_mul_ps(_mm256_set1_ps(0.114f), b)));
+	}
+	return x;
+}
+#endif
+
+/* The luma of a row of RGB pixels, as luma_plane weighs it. */
+inline void luma_row(const uint8_t *px, int width, float *dst, Path path)
+{
+	(void)path;
+	int x = 0;
+#if KIT_X86
+	if (path == Path::AVX2)
+		x = luma_row_avx2(px, width, dst);
+#endif
+	for (; x < width; ++x)
+		dst[x] = 0.299f * px[3 * x] + 0.587f * px[3 * x + 1] + 0.114f * px[3 * x + 2];
+}
+
 /* Writes the planes back, clamped and rounded; a fourth byte, when the
  * layout has one, is set opaque. */
 inline void write_rgb(const Rgb &rgb, uint8_t *px, int step, int ri, int gi, int bi)
@@ -478,50 +510,80 @@ __attribute__((target("avx2"))) inline int shrink_blocks_avx2(const float *src, 
 	}
 	return sx;
 }
+
+/* The factor-2 case: eight pairs a step, each summed left to right and
+ * added to its running sum; returns the first pair left for the plain
+ * loop. */
+__attribute__((target("avx2"))) inline int shrink_pairs_avx2(const float *src, int pairs, float *row_sum)
+{
+	int sx = 0;
+	for (; sx + 8 <= pairs; sx += 8) {
+		const __m256 low = _mm256_loadu_ps(src + 2 * sx), high = _mm256_loadu_ps(src + 2 * sx + 8);
+		/* The pairs are summed within each half; the halves then put
+		 * them in order. */
+		const __m256 sums =
+			_mm256_castpd_ps(_mm256_permute4x64_pd(_mm256_castps_pd(_mm256_hadd_ps(low, high)), 0xD8));
+		_mm256_storeu_ps(row_sum + sx, _mm256_add_ps(_mm256_loadu_ps(row_sum + sx), sums));
+	}
+	return sx;
+}
 #endif
 
-/* Mean of each factor x factor block (the last ones partial) of a picture
- * whose rows `rows(y)` hands out in order. */
+/* Row `sy` of the means of factor x factor blocks (the last ones partial)
+ * of a width x height picture whose rows `rows(y)` hands out: rows
+ * sy * factor on, in order. `row_sum` holds a shrunk row's width of
+ * scratch. */
+template <class Rows>
+void shrink_row(int width, int height, int factor, int sy, Rows &&rows, float *row_sum, float *dst, Path path)
+{
+	(void)path;
+	const int small_width = (width + factor - 1) / factor;
+	std::fill(row_sum, row_sum + small_width, 0.f);
+	const int y0 = sy * factor, y1 = std::min(y0 + factor, height);
+	for (int y = y0; y < y1; ++y) {
+		const float *src = rows(y);
+		if (factor == 2) {
+			/* The common case, without the inner loop's overhead. */
+			const int pairs = width / 2;
+			int sx = 0;
+#if KIT_X86
+			if (path == Path::AVX2)
+				sx = shrink_pairs_avx2(src, pairs, row_sum);
+#endif
+			for (; sx < pairs; ++sx)
+				row_sum[sx] += src[2 * sx] + src[2 * sx + 1];
+			if (width % 2)
+				row_sum[pairs] += src[width - 1];
+			continue;
+		}
+		int sx = 0;
+#if KIT_X86
+		if (path == Path::AVX2)
+			sx = shrink_blocks_avx2(src, width, factor, row_sum);
+#endif
+		for (; sx < small_width; ++sx) {
+			const int x0 = sx * factor, x1 = std::min(x0 + factor, width);
+			float sum = 0.f;
+			for (int x = x0; x < x1; ++x)
+				sum += src[x];
+			row_sum[sx] += sum;
+		}
+	}
+	for (int sx = 0; sx < small_width; ++sx) {
+		const int columns = std::min(factor, width - sx * factor);
+		dst[sx] = row_sum[sx] / float(columns * (y1 - y0));
+	}
+}
+
+/* The whole shrunk picture. */
 template <class Rows>
 Plane shrink_rows(int width, int height, int factor, Rows &&rows)
 {
 	const Path path = best_path();
-	(void)path;
 	Plane small((width + factor - 1) / factor, (height + factor - 1) / factor);
-	std::vector<float> row_sum(size_t(small.width));
-	for (int sy = 0; sy < small.height; ++sy) {
-		std::fill(row_sum.begin(), row_sum.end(), 0.f);
-		const int y0 = sy * factor, y1 = std::min(y0 + factor, height);
-		for (int y = y0; y < y1; ++y) {
-			const float *src = rows(y);
-			if (factor == 2) {
-				/* The common case, without the inner loop's overhead. */
-				const int pairs = width / 2;
-				for (int sx = 0; sx < pairs; ++sx)
-					row_sum[size_t(sx)] += src[2 * sx] + src[2 * sx + 1];
-				if (width % 2)
-					row_sum[size_t(pairs)] += src[width - 1];
-				continue;
-			}
-			int sx = 0;
-#if KIT_X86
-			if (path == Path::AVX2)
-				sx = shrink_blocks_avx2(src, width, factor, row_sum.data());
-#endif
-			for (; sx < small.width; ++sx) {
-				const int x0 = sx * factor, x1 = std::min(x0 + factor, width);
-				float sum = 0.f;
-				for (int x = x0; x < x1; ++x)
-					sum += src[x];
-				row_sum[size_t(sx)] += sum;
-			}
-		}
-		float *dst = small.row(sy);
-		for (int sx = 0; sx < small.width; ++sx) {
-			const int columns = std::min(factor, width - sx * factor);
-			dst[sx] = row_sum[size_t(sx)] / float(columns * (y1 - y0));
-		}
-	}
+	Floats row_sum(size_t(small.width));
+	for (int sy = 0; sy < small.height; ++sy)
+		shrink_row(width, height, factor, sy, rows, row_sum.data(), small.row(sy), path);
 	return small;
 }
 
@@ -530,27 +592,88 @@ inline Plane shrink(const Plane &p, int factor)
 	return shrink_rows(p.width, p.height, factor, [&](int y) { return p.row(y); });
 }
 
+/* Rows of a generator that makes them once each, in order (`make(y, row)`
+ * fills row y), kept from the oldest row a reader may still ask for to the
+ * newest made: readers ahead make rows as they ask, and the slowest one
+ * lets the old rows go with keep_from. The store starts with room for
+ * `rows` rows (all of them, where a reader must see the whole picture
+ * before the first rows are used) and doubles when the readers are further
+ * apart. A row's pointer holds until rows are next made. */
+class RowWindow {
+public:
+	using Make = std::function<void(int, float *)>;
+
+	RowWindow(int row_length, int rows, Make make)
+		: length_(size_t(row_length)), capacity_(std::max(rows, 1)), make_(std::move(make)),
+		  store_(size_t(capacity_) * length_)
+	{
+	}
+
+	/* Row y, not below the last keep_from. */
+	const float *row(int y)
+	{
+		while (made_ < y) {
+			if (made_ + 1 - kept_from_ >= capacity_)
+				grow();
+			++made_;
+			make_(made_, slot(made_));
+		}
+		return slot(y);
+	}
+
+	/* No row below y is asked for again. */
+	void keep_from(int y) { kept_from_ = std::max(kept_from_, y); }
+
+private:
+	float *slot(int y) { return store_.data() + size_t(y % capacity_) * length_; }
+
+	void grow()
+	{
+		const int capacity = 2 * capacity_;
+		Floats store(size_t(capacity) * length_);
+		for (int y = kept_from_; y <= made_; ++y)
+			std::copy(slot(y), slot(y) + length_, store.data() + size_t(y % capacity) * length_);
+		store_.swap(store);
+		capacity_ = capacity;
+	}
+
+	size_t length_;
+	int capacity_, made_ = -1, kept_from_ = 0;
+	Make make_;
+	Floats store_;
+};
+
 /* Bilinear enlargement of a shrunk plane, a row at a time: each output row
  * mixes two rows of the small plane interpolated across, which are worked
- * out once and kept while the output rows between them are made. */
+ * out once and kept while the output rows between them are made. Output
+ * rows asked for in order ask for each small row once, in order, so a
+ * generator may make those as they are needed. */
 class Expander {
 public:
+	using SmallRows = std::function<const float *(int)>;
+
 	Expander(const Plane &small, int factor, int width, int height)
-		: small_(small), height_(height), inverse_(1.f / float(factor)), x0_(size_t(width)), x1_(size_t(width)),
-		  fx_(size_t(width)), across_{Floats(size_t(width)), Floats(size_t(width))}
+		: Expander(small.width, small.height, [&small](int y) { return small.row(y); }, factor, width, height)
+	{
+	}
+
+	Expander(int small_width, int small_height, SmallRows small_rows, int factor, int width, int height)
+		: small_rows_(std::move(small_rows)), small_width_(small_width), small_height_(small_height), height_(height),
+		  inverse_(1.f / float(factor)), x0_(size_t(width)), x1_(size_t(width)), fx_(size_t(width)),
+		  across_{Floats(size_t(width)), Floats(size_t(width))}
 	{
 		for (int x = 0; x < width; ++x) {
-			float sx = std::clamp((float(x) + 0.5f) * inverse_ - 0.5f, 0.f, float(small.width - 1));
+			float sx = std::clamp((float(x) + 0.5f) * inverse_ - 0.5f, 0.f, float(small_width - 1));
 			x0_[size_t(x)] = int(sx);
-			x1_[size_t(x)] = std::min(int(sx) + 1, small.width - 1);
+			x1_[size_t(x)] = std::min(int(sx) + 1, small_width - 1);
 			fx_[size_t(x)] = sx - float(int(sx));
 		}
 	}
 
 	void row(int y, float *dst)
 	{
-		float sy = std::clamp((float(y) + 0.5f) * inverse_ - 0.5f, 0.f, float(small_.height - 1));
-		int y0 = int(sy), y1 = std::min(y0 + 1, small_.height - 1);
+		float sy = std::clamp((float(y) + 0.5f) * inverse_ - 0.5f, 0.f, float(small_height_ - 1));
+		int y0 = int(sy), y1 = std::min(y0 + 1, small_height_ - 1);
 		float fy = sy - float(y0);
 		const float *t = across(y0, y1), *u = across(y1, y0);
 		const size_t width = fx_.size();
@@ -569,7 +692,7 @@ private:
 				return across_[i].data();
 		const int slot = held_[0] == other ? 1 : 0;
 		held_[slot] = wanted;
-		const float *src = small_.row(wanted);
+		const float *src = small_rows_(wanted);
 		float *dst = across_[slot].data();
 		size_t x = 0;
 #if KIT_X86
@@ -597,7 +720,7 @@ private:
 			const __m256i right = _mm256_loadu_si256(reinterpret_cast<const __m256i *>(&x1_[x]));
 			const int first = x0_[x];
 			__m256 a, b;
-			if (x1_[x + 7] - first < 8 && first + 8 <= small_.width) {
+			if (x1_[x + 7] - first < 8 && first + 8 <= small_width_) {
 				const __m256 window = _mm256_loadu_ps(src + first);
 				const __m256i start = _mm256_set1_epi32(first);
 				a = _mm256_permutevar8x32_ps(window, _mm256_sub_epi32(left, start));
@@ -612,8 +735,8 @@ private:
 	}
 #endif
 
-	const Plane &small_;
-	int height_;
+	SmallRows small_rows_;
+	int small_width_, small_height_, height_;
 	Path path_ = best_path();
 	float inverse_;
 	std::vector<int> x0_, x1_;
@@ -653,7 +776,7 @@ public:
 			expander_ = std::make_unique<Expander>(small_, factor, width, height);
 			return;
 		}
-		if (sigma > 0.f && sigma < 2.5f) {
+		if (narrow(sigma)) {
 			taps_ = gaussian_taps(sigma);
 			radius_ = int(taps_.size() / 2);
 			sources_.resize(taps_.size());
@@ -671,6 +794,10 @@ public:
 		}
 		gaussian_blur_full(whole_, sigma);
 	}
+
+	/* A narrow blur asks for the rows only as its own rows are asked for,
+	 * a few ahead; any other reads every row when it is made. */
+	static bool narrow(float sigma) { return sigma > 0.f && sigma < 2.5f; }
 
 	void row(int y, float *dst)
 	{

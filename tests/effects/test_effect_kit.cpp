@@ -73,4 +73,97 @@ TEST(EffectKit, ExpandedRowsMatchThePlainBilinearFormula)
 	}
 }
 
+/* Block means on both paths, each block summed left to right and the rows'
+ * sums added top to bottom; widths around the vector steps (8 pairs, 8
+ * blocks) and partial last blocks. */
+TEST(EffectKit, ShrunkRowsMatchThePlainBlockMeansOnBothPaths)
+{
+	std::vector<kit::Path> paths{kit::Path::REFERENCE};
+	if (__builtin_cpu_supports("avx2"))
+		paths.push_back(kit::Path::AVX2);
+	for (int factor : {2, 3, 5}) {
+		for (auto [w, h] : std::initializer_list<std::pair<int, int>>{{1, 1}, {1, 5}, {15, 2}, {16, 3}, {17, 4}, {33, 7}, {81, 5}}) {
+			const kit::Plane src = random_plane(w, h, uint32_t(factor * 13 + w * 3 + h));
+			const int small_width = (w + factor - 1) / factor, small_height = (h + factor - 1) / factor;
+			std::vector<float> want(size_t(small_width) * size_t(small_height));
+			for (int sy = 0; sy < small_height; ++sy)
+				for (int sx = 0; sx < small_width; ++sx) {
+					const int y1 = std::min((sy + 1) * factor, h), x1 = std::min((sx + 1) * factor, w);
+					float total = 0.f;
+					for (int y = sy * factor; y < y1; ++y) {
+						float sum = 0.f;
+						for (int x = sx * factor; x < x1; ++x)
+							sum += src.row(y)[x];
+						total += sum;
+					}
+					want[size_t(sy * small_width + sx)] = total / float((x1 - sx * factor) * (y1 - sy * factor));
+				}
+			for (kit::Path path : paths) {
+				std::vector<float> got(want.size(), -1.f);
+				std::vector<float> scratch(static_cast<size_t>(small_width));
+				for (int sy = 0; sy < small_height; ++sy)
+					kit::shrink_row(w, h, factor, sy, [&](int y) { return src.row(y); }, scratch.data(),
+							&got[size_t(sy * small_width)], path);
+				EXPECT_TRUE(got == want) << "factor " << factor << " " << w << "x" << h << " path " << int(path);
+			}
+		}
+	}
+}
+
+/* The streamed stages of an effect read one generator from two places at
+ * once, far apart: every row must reach each reader as it was made, made
+ * once, and rows a reader still needs must survive the store growing. */
+TEST(EffectKit, RowWindowKeepsWhatItsReadersStillNeed)
+{
+	const int width = 5, height = 300;
+	auto value = [](int y, int x) { return float(y * 1000 + x); };
+	for (int first_room : {1, 8, height}) {
+		for (int lead : {0, 3, 40, height}) {
+			std::vector<int> made;
+			kit::RowWindow window(width, first_room, [&](int y, float *row) {
+				made.push_back(y);
+				for (int x = 0; x < width; ++x)
+					row[x] = value(y, x);
+			});
+			for (int y = 0; y < height; ++y) {
+				window.keep_from(y);
+				const float *ahead = window.row(std::min(y + lead, height - 1));
+				ASSERT_EQ(ahead[width - 1], value(std::min(y + lead, height - 1), width - 1));
+				const float *row = window.row(y);
+				for (int x = 0; x < width; ++x)
+					ASSERT_EQ(row[x], value(y, x)) << "room " << first_room << " lead " << lead << " row " << y;
+			}
+			ASSERT_EQ(made.size(), size_t(height));
+			for (int y = 0; y < height; ++y)
+				ASSERT_EQ(made[size_t(y)], y);
+		}
+	}
+}
+
+/* Output rows asked for in order ask for each small row once, in order:
+ * what lets a generator make the small rows as they are needed. */
+TEST(EffectKit, ExpanderAsksForEachSmallRowOnceInOrder)
+{
+	for (int factor : {1, 2, 3}) {
+		for (auto [w, h] : std::initializer_list<std::pair<int, int>>{{1, 1}, {7, 1}, {9, 14}, {20, 31}}) {
+			const kit::Plane small = random_plane((w + factor - 1) / factor, (h + factor - 1) / factor, uint32_t(w + h));
+			kit::Plane want(w, h);
+			kit::expand_into(small, factor, want);
+			std::vector<int> asked;
+			kit::Expander rows(small.width, small.height, [&](int y) {
+				asked.push_back(y);
+				return small.row(y);
+			}, factor, w, h);
+			kit::Plane got(w, h, -1.f);
+			for (int y = 0; y < h; ++y)
+				rows.row(y, got.row(y));
+			EXPECT_TRUE(got.v == want.v) << "factor " << factor << " " << w << "x" << h;
+			std::vector<int> in_order(size_t(small.height));
+			for (int y = 0; y < small.height; ++y)
+				in_order[size_t(y)] = y;
+			EXPECT_EQ(asked, in_order) << "factor " << factor << " " << w << "x" << h;
+		}
+	}
+}
+
 } // namespace

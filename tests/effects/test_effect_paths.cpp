@@ -68,8 +68,9 @@ TEST_P(EffectPaths, VectorPathMatchesTheReference)
 	for (int side : {1, 2, 3, 7, 8, 9, 15, 16, 17, 33})
 		sizes.insert(sizes.end(), {{side, 1}, {1, side}, {side, side}, {side + 2, 5}});
 	/* Long thin pictures: a large extent takes the shrunk blurs and the
-	 * half-size grids at little cost. */
-	sizes.insert(sizes.end(), {{160, 120}, {157, 31}, {700, 9}, {9, 701}, {1283, 6}});
+	 * half-size grids at little cost, and the widest blurs, which read
+	 * the whole picture before the first row is drawn. */
+	sizes.insert(sizes.end(), {{160, 120}, {157, 31}, {700, 9}, {9, 701}, {1283, 6}, {1601, 3}, {2, 1933}, {5131, 2}});
 	for (auto [w, h] : sizes) {
 		const Bytes in = random_picture(w, h, uint32_t(w * 7919 + h));
 		const Bytes want = run_on(kit::Path::REFERENCE, e.run, in, w, h);
