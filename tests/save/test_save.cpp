@@ -5,7 +5,9 @@
 #include <platform_log.h>
 #include <media_db.h>
 
+#include <algorithm>
 #include <cerrno>
+#include <chrono>
 #include <fcntl.h>
 #include <cstdio>
 #include <cstring>
@@ -542,6 +544,20 @@ TEST_F(SaveTest, SavesKilledOnTheirWayLeaveNothingBehind)
 		return pid;
 	};
 
+	// The kills fall within a save's own length on this machine: a fixed
+	// span missed nearly every save on a machine where they were quick.
+	auto microseconds_since = [](const std::chrono::steady_clock::time_point &start) {
+		return std::chrono::duration_cast<std::chrono::microseconds>(std::chrono::steady_clock::now() - start).count();
+	};
+	long save_length = 1;
+	for (int run = 0; run < 3; run++) {
+		auto start = std::chrono::steady_clock::now();
+		pid_t child = save_in_child();
+		ASSERT_GT(child, 0);
+		waitpid(child, nullptr, 0);
+		save_length = std::max<long>(save_length, microseconds_since(start));
+	}
+
 	// Kills saves at random points until `wanted` of them left something
 	// besides whole pictures, or `count` were killed; returns how many did.
 	// Each save clears what the one killed before it left.
@@ -549,9 +565,13 @@ TEST_F(SaveTest, SavesKilledOnTheirWayLeaveNothingBehind)
 	auto kill_saves = [&](int count, int wanted) {
 		int left_behind = 0;
 		for (int kill_count = 0; kill_count < count && left_behind < wanted; kill_count++) {
+			auto start = std::chrono::steady_clock::now();
 			pid_t child = save_in_child();
 			EXPECT_GT(child, 0);
-			usleep(5000 + rng() % 50000);
+			// The main loop's child handler cuts sleeps short; sleep on.
+			long kill_at = rng() % save_length;
+			for (long now = microseconds_since(start); now < kill_at; now = microseconds_since(start))
+				usleep(kill_at - now);
 			kill(child, SIGKILL);
 			waitpid(child, nullptr, 0);
 			size_t found = 0;
