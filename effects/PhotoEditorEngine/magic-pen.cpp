@@ -14,28 +14,25 @@ inline int magic_pen_body(const uint8_t *in, uint8_t *out, int width, int height
 		const kit::Path path = kit::best_path();
 		const float extent = float(std::max(width, height));
 
-		/* The lines, kept whole: the halo blurs them all before the first
-		 * row is drawn. The luma is smoothed as its rows come, and each
-		 * line row is found from three smoothed rows. */
-		kit::Plane lines(width, height);
-		{
-			kit::Floats luma(static_cast<size_t>(width));
-			kit::BlurredRows smoothed(width, height, std::max(0.7f, extent / 900.f), [&](int y) {
-				kit::luma_row(in + size_t(y) * size_t(width) * 3, width, luma.data(), path);
-				return luma.data();
-			});
-			kit::Floats ring(size_t(width) * 3);
-			auto smoothed_at = [&](int y) { return &ring[size_t(y % 3) * size_t(width)]; };
-			for (int y = 0, made = -1; y < height; ++y) {
-				const int below = std::min(y + 1, height - 1);
-				while (made < below)
-					++made, smoothed.row(made, smoothed_at(made));
-				float *line = lines.row(y);
-				kit::sobel_row(smoothed_at(std::max(y - 1, 0)), smoothed_at(y), smoothed_at(below), width, line);
-				for (int x = 0; x < width; ++x)
-					line[x] = kit::smoothstep(12.f, 90.f, line[x]);
-			}
-		}
+		/* The lines, made a row at a time from the luma smoothed as its
+		 * rows come (each line row from three smoothed rows), and kept
+		 * from the row being drawn to the furthest the halo has read. */
+		kit::Floats luma(static_cast<size_t>(width));
+		kit::BlurredRows smoothed(width, height, std::max(0.7f, extent / 900.f), [&](int y) {
+			kit::luma_row(in + size_t(y) * size_t(width) * 3, width, luma.data(), path);
+			return luma.data();
+		});
+		kit::Floats ring(size_t(width) * 3);
+		auto smoothed_at = [&](int y) { return &ring[size_t(y % 3) * size_t(width)]; };
+		int smoothed_to = -1;
+		kit::RowWindow lines(width, 32, [&](int y, float *line) {
+			const int below = std::min(y + 1, height - 1);
+			while (smoothed_to < below)
+				++smoothed_to, smoothed.row(smoothed_to, smoothed_at(smoothed_to));
+			kit::sobel_row(smoothed_at(std::max(y - 1, 0)), smoothed_at(y), smoothed_at(below), width, line);
+			for (int x = 0; x < width; ++x)
+				line[x] = kit::smoothstep(12.f, 90.f, line[x]);
+		});
 		kit::BlurredRows halo(width, height, extent / 160.f, [&](int y) { return lines.row(y); });
 
 		/* The stroke colour: the picture's colour smoothed, so that a line
@@ -48,10 +45,12 @@ inline int magic_pen_body(const uint8_t *in, uint8_t *out, int width, int height
 		float *halo_row = rows.data(), *red = halo_row + width, *green = red + width, *blue = green + width;
 		constexpr float BRIGHTEST = 0.85f * 255.f;
 		for (int y = 0; y < height; ++y) {
+			lines.keep_from(y);
 			halo.row(y, halo_row);
 			colour[0].row(y, red);
 			colour[1].row(y, green);
 			colour[2].row(y, blue);
+			/* Taken after the halo, whose reading ahead may move it. */
 			const float *line = lines.row(y);
 			/* Each pixel's colour is replaced by its stroke, then written. */
 			for (int x = 0; x < width; ++x) {

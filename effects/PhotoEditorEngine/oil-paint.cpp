@@ -179,8 +179,7 @@ inline int oil_paint_body(const uint8_t *in, uint8_t *out, int width, int height
 		/* The dabs, red, green and blue rows side by side, kept from the
 		 * row being drawn to the furthest one the blurs below have read. */
 		KuwaharaRows dabs(in, width, height, std::max(2, int(extent / 160.f)), path);
-		const bool streamed = kit::BlurredRows::narrow(flow_sigma) && kit::BlurredRows::narrow(relief_sigma);
-		kit::RowWindow paint(3 * width, streamed ? 32 : height,
+		kit::RowWindow paint(3 * width, 32,
 				     [&](int, float *row) { dabs.next(row, row + width, row + 2 * width); });
 
 		/* The relief is the paint's luma, made a row at a time. */

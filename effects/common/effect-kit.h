@@ -761,8 +761,11 @@ inline void gaussian_blur_full(Plane &p, float sigma);
  * row at a time, in order. A narrow blur convolves rows as they are needed,
  * keeping the 2r + 1 rows blurred across in a ring; a wide one is worked
  * out on a shrunk copy (where it costs a fraction and looks the same) and
- * enlarged row by row. Nothing of the picture's size is kept but what a
- * blur between those two needs. */
+ * enlarged row by row, the shrunk rows made and blurred, by the narrow
+ * blur, as the enlargement asks for them. Either asks for each row once,
+ * in order, a few rows ahead of the row given out. Only a wide blur whose
+ * shrunk copy would still need a wide blur (a picture too thin to shrink
+ * by the blur's measure) reads every row when it is made. */
 class BlurredRows {
 public:
 	template <class Rows>
@@ -770,19 +773,35 @@ public:
 	{
 		const int factor = std::min({int(sigma / 1.6f), width, height});
 		if (factor >= 2) {
+			const float small_sigma =
+				std::sqrt(std::max(0.f, sigma * sigma - float(factor * factor) / 4.f)) / float(factor);
+			const int small_width = (width + factor - 1) / factor, small_height = (height + factor - 1) / factor;
+			if (narrow(small_sigma)) {
+				/* One shrunk row's sums, the shrunk row, and it blurred. */
+				shrunk_ = Floats(size_t(small_width) * 3);
+				small_blur_.reset(new BlurredRows(small_width, small_height));
+				small_blur_->start_narrow(small_sigma, [this, rows, factor, small_width](int sy) mutable {
+					float *row_sum = shrunk_.data(), *row = row_sum + small_width;
+					shrink_row(width_, height_, factor, sy, rows, row_sum, row, path_);
+					return static_cast<const float *>(row);
+				});
+				expander_ = std::make_unique<Expander>(
+					small_width, small_height,
+					[this, small_width](int sy) {
+						float *row = shrunk_.data() + 2 * size_t(small_width);
+						small_blur_->row(sy, row);
+						return static_cast<const float *>(row);
+					},
+					factor, width, height);
+				return;
+			}
 			small_ = shrink_rows(width, height, factor, rows);
-			gaussian_blur_full(small_, std::sqrt(std::max(0.f, sigma * sigma - float(factor * factor) / 4.f)) /
-							   float(factor));
+			gaussian_blur_full(small_, small_sigma);
 			expander_ = std::make_unique<Expander>(small_, factor, width, height);
 			return;
 		}
 		if (narrow(sigma)) {
-			taps_ = gaussian_taps(sigma);
-			radius_ = int(taps_.size() / 2);
-			sources_.resize(taps_.size());
-			ring_ = Floats(size_t(2 * radius_ + 1) * size_t(width));
-			line_ = Floats(size_t(width + 2 * radius_));
-			source_ = [rows](int y) mutable { return rows(y); };
+			start_narrow(sigma, [rows](int y) mutable { return static_cast<const float *>(rows(y)); });
 			return;
 		}
 		/* No blur, or a wide one on a picture too small to shrink: the
@@ -795,9 +814,9 @@ public:
 		gaussian_blur_full(whole_, sigma);
 	}
 
-	/* A narrow blur asks for the rows only as its own rows are asked for,
-	 * a few ahead; any other reads every row when it is made. */
-	static bool narrow(float sigma) { return sigma > 0.f && sigma < 2.5f; }
+	/* The generators hold this record's address. */
+	BlurredRows(const BlurredRows &) = delete;
+	BlurredRows &operator=(const BlurredRows &) = delete;
 
 	void row(int y, float *dst)
 	{
@@ -813,6 +832,23 @@ public:
 	}
 
 private:
+	using Source = std::function<const float *(int)>;
+
+	/* Blurs narrower than this are convolved directly. */
+	static bool narrow(float sigma) { return sigma > 0.f && sigma < 2.5f; }
+
+	BlurredRows(int width, int height) : width_(width), height_(height) {}
+
+	void start_narrow(float sigma, Source source)
+	{
+		taps_ = gaussian_taps(sigma);
+		radius_ = int(taps_.size() / 2);
+		sources_.resize(taps_.size());
+		ring_ = Floats(size_t(2 * radius_ + 1) * size_t(width_));
+		line_ = Floats(size_t(width_ + 2 * radius_));
+		source_ = std::move(source);
+	}
+
 	/* Row j blurred across into its ring slot: the row widened by its
 	 * edge values, then the taps added in order over the whole row. */
 	void across(int j)
@@ -843,13 +879,15 @@ private:
 	int width_, height_;
 	Path path_ = best_path();
 	Plane small_, whole_;
+	Floats shrunk_;
+	std::unique_ptr<BlurredRows> small_blur_;
 	std::unique_ptr<Expander> expander_;
 	std::vector<float> taps_;
 	std::vector<const float *> sources_;
 	int radius_ = 0;
 	int blurred_to_ = -1;
 	Floats ring_, line_;
-	std::function<const float *(int)> source_;
+	Source source_;
 };
 
 /* Direct separable convolution with a sampled Gaussian, in place. */

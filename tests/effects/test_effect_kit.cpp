@@ -110,6 +110,51 @@ TEST(EffectKit, ShrunkRowsMatchThePlainBlockMeansOnBothPaths)
 	}
 }
 
+/* A wide blur is the blur of the shrunk picture enlarged; worked out as
+ * its rows are given out, it asks for each row once, in order, a few
+ * shrunk rows ahead, so that a generator feeding it keeps only those. A
+ * picture too thin to shrink by the blur's measure is read whole. */
+TEST(EffectKit, WideBlurRowsStreamTheEnlargedBlurOfTheShrunkPicture)
+{
+	for (float sigma : {3.3f, 5.f, 8.1f, 13.f}) {
+		const int factor = int(sigma / 1.6f);
+		for (auto [w, h] : std::initializer_list<std::pair<int, int>>{{1, 1}, {3, 50}, {50, 3}, {37, 41}, {120, 7}, {64, 64}}) {
+			const kit::Plane src = random_plane(w, h, uint32_t(w * 13 + h));
+			kit::Plane want(w, h);
+			const int shrink_by = std::min({factor, w, h});
+			if (shrink_by >= 2) {
+				kit::Plane small = kit::shrink(src, shrink_by);
+				kit::gaussian_blur_full(small, std::sqrt(sigma * sigma - float(shrink_by * shrink_by) / 4.f) / float(shrink_by));
+				kit::expand_into(small, shrink_by, want);
+			} else {
+				want = src;
+				kit::gaussian_blur_full(want, sigma);
+			}
+			std::vector<int> asked;
+			kit::BlurredRows rows(w, h, sigma, [&](int y) {
+				asked.push_back(y);
+				return src.row(y);
+			});
+			const bool streamed = shrink_by == factor;
+			if (streamed) {
+				EXPECT_TRUE(asked.empty()) << "rows read before any was given out";
+			}
+			kit::Plane got(w, h, -1.f);
+			for (int y = 0; y < h; ++y) {
+				rows.row(y, got.row(y));
+				if (streamed && !asked.empty()) {
+					ASSERT_LE(asked.back(), y + 10 * factor) << "sigma " << sigma << " " << w << "x" << h;
+				}
+			}
+			EXPECT_TRUE(got.v == want.v) << "sigma " << sigma << " " << w << "x" << h;
+			std::vector<int> in_order(static_cast<size_t>(h));
+			for (int y = 0; y < h; ++y)
+				in_order[size_t(y)] = y;
+			EXPECT_EQ(asked, in_order) << "sigma " << sigma << " " << w << "x" << h;
+		}
+	}
+}
+
 /* The streamed stages of an effect read one generator from two places at
  * once, far apart: every row must reach each reader as it was made, made
  * once, and rows a reader still needs must survive the store growing. */
