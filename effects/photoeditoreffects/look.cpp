@@ -345,17 +345,33 @@ void build_curves(const Look &look, LevelCurves *curves)
 	const kit::Curve base[3] = {kit::make_curve(look.red), kit::make_curve(look.green),
 				    kit::make_curve(look.blue)};
 	const float colour[3] = {float(look.colour.r), float(look.colour.g), float(look.colour.b)};
+	/* Each curve over the padded span, carried on at slope 1 past its
+	 * ends: worked out once, so that the level loop below reads in order
+	 * and runs a vector at a time. */
+	float extended[3][CURVE_SPAN];
+	for (int c = 0; c < 3; ++c)
+		for (int i = 0; i < CURVE_SPAN; ++i) {
+			int v = i - CURVE_PAD;
+			extended[c][i] = base[c].map[std::clamp(v, 0, 255)] + float(v - std::clamp(v, 0, 255));
+		}
 	for (int level = 0; level < LEVELS; ++level) {
 		float w = look.strength * float(level) / float(LEVELS - 1);
 		for (int c = 0; c < 3; ++c) {
+			const float *from = extended[c];
+			float shaded[CURVE_SPAN];
+			if (look.radial == RADIAL_SHADE)
+				for (int i = 0; i < CURVE_SPAN; ++i)
+					shaded[i] = from[i] + (colour[c] - from[i]) * w;
+			else if (look.radial == RADIAL_GLOW)
+				for (int i = 0; i < CURVE_SPAN; ++i)
+					shaded[i] = from[i] + (255.f - from[i]) * colour[c] / 255.f * w;
+			else
+				std::copy(from, from + CURVE_SPAN, shaded);
+			uint8_t *to = curves->map[level][c];
+			/* kit::clamp_byte, in a form that runs a vector at a time. */
 			for (int i = 0; i < CURVE_SPAN; ++i) {
-				int v = i - CURVE_PAD;
-				float t = base[c].map[std::clamp(v, 0, 255)] + float(v - std::clamp(v, 0, 255));
-				if (look.radial == RADIAL_SHADE)
-					t += (colour[c] - t) * w;
-				else if (look.radial == RADIAL_GLOW)
-					t += (255.f - t) * colour[c] / 255.f * w;
-				curves->map[level][c][i] = kit::clamp_byte(t);
+				const float t = shaded[i] > 0.f ? shaded[i] : 0.f;
+				to[i] = uint8_t(int((t < 255.f ? t : 255.f) + 0.5f));
 			}
 		}
 	}
